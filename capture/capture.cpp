@@ -1,0 +1,91 @@
+#include "capture/capture.h"
+
+#include <pthread.h>
+#include <string.h>
+#include <unistd.h>
+
+#include "capture/capture_state.h"
+#include "capture/children.h"
+#include "capture/exec_shell.h"
+#include "capture/recorders.h"
+#include "core/log.h"
+#include "core/pause.h"
+#include "storage/earlier_logs.h"
+
+namespace corvexd {
+namespace {
+
+constexpr time_t kSettlingTime = 1;  // seconds
+
+struct RecorderStart {
+  const Recorder* recorder;
+  const CaptureSwitches* switches;
+};
+
+void run_recorder(const void* argument) {
+  const auto& start = *static_cast<const RecorderStart*>(argument);
+  start.recorder->run(*start.switches);
+}
+
+void start_copy_of_earlier_logs() {
+  pthread_t thread;
+  int error = pthread_create(&thread, nullptr, copy_file_already_exist, nullptr);
+  if (error != 0) {
+    log_error("corvexd: no thread to copy earlier logs: %s\n", strerror(error));
+    return;
+  }
+  pthread_detach(thread);
+}
+
+// The two switches of the android recorder were read before the properties were dumped; every other
+// one counts as it stands when its turn comes.
+bool starts(const Recorder& recorder, const CaptureSwitches& switches) {
+  if (recorder.slot == &android_pid) return switches.main || switches.system;
+  return switched_on(recorder.switches[0]);
+}
+
+bool stops(const Recorder& recorder) {
+  bool on = false;
+  for (const char* property : recorder.switches) {
+    if (property != nullptr && switched_on(property)) on = true;
+  }
+  return on;
+}
+
+void close_slot(int32_t* descriptor) {
+  if (descriptor == nullptr || *descriptor < 0) return;
+  close(*descriptor);
+  *descriptor = -1;
+}
+
+}  // namespace
+
+void executeLogcat() {
+  handle_ended_children();
+  const CaptureSwitches switches = {switched_on("persist.sys.main"),
+                                    switched_on("persist.sys.system"),
+                                    switched_on("persist.sys.kernel.kmsg")};
+  capture_running = 1;
+  start_copy_of_earlier_logs();
+  exec_shell("getprop", "getprop.txt");
+  for (const Recorder& recorder : kRecorders) {
+    if (!starts(recorder, switches)) continue;
+    RecorderStart start = {&recorder, &switches};
+    start_child(*recorder.slot, run_recorder, &start);
+  }
+  pause_seconds(kSettlingTime);
+  stop_logcat = 0;
+}
+
+void stopLogcat() {
+  stop_logcat = 1;
+  capture_running = 0;
+  for (const Recorder& recorder : kRecorders) {
+    if (!stops(recorder)) continue;
+    for (int32_t* descriptor : recorder.descriptors) close_slot(descriptor);
+    terminate_child(*recorder.slot);
+    forget_child(*recorder.slot);
+  }
+}
+
+}  // namespace corvexd

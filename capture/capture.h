@@ -1,0 +1,16 @@
+// The start and the end of a capture.
+#pragma once
+
+namespace corvexd {
+
+// Starts a capture into LOG_DIR: dumps the properties, starts the thread that copies earlier logs
+// and every recorder whose switch is on. Main thread. Returns after about two seconds and waits for
+// no recorder; one that could not be started is missing from this capture. A capture already
+// running goes on beside it, unobserved.
+void executeLogcat();
+
+// Ends the recorders of the latest capture whose switches are on, with SIGTERM. Main thread.
+// Returns at once; the others keep running.
+void stopLogcat();
+
+}  // namespace corvexd

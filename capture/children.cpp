@@ -1,0 +1,149 @@
+#include "capture/children.h"
+
+#include <errno.h>
+#include <sched.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+
+#include "capture/capture_state.h"
+#include "core/local_time.h"
+#include "core/log.h"
+
+// The handler runs on any thread, at any moment, and reaps any child, and a number is free for
+// another process once its child is reaped. So:
+//
+// - Slots are read and written, children reaped and signals sent under one spin lock. It is taken
+//   with SIGCHLD blocked on the taking thread, so the handler never waits for the thread that it
+//   interrupted, and nobody who holds it blocks: a slot that says "running" cannot lose its child
+//   between the test and the kill.
+// - No lock of ours is held across fork(). The C library takes its allocation locks there; a thread
+//   interrupted inside an allocation would otherwise spin in the handler for a lock whose owner
+//   waits for that very allocation.
+// - Between a fork and the storing of its result nobody can tell which slot a child belongs to.
+//   Deliveries of that moment are counted and carried out by the starter right afterwards, so a
+//   child that ends at once is still found in its slot.
+
+namespace corvexd {
+namespace {
+
+std::atomic_flag slots_locked = ATOMIC_FLAG_INIT;
+ChildSlot* known_slots = nullptr;
+bool starting = false;
+int deferred_deliveries = 0;
+
+class SlotLock {
+ public:
+  SlotLock() {
+    sigset_t child_ended;
+    sigemptyset(&child_ended);
+    sigaddset(&child_ended, SIGCHLD);
+    pthread_sigmask(SIG_BLOCK, &child_ended, &earlier_mask_);
+    while (slots_locked.test_and_set(std::memory_order_acquire)) sched_yield();
+  }
+  ~SlotLock() {
+    slots_locked.clear(std::memory_order_release);
+    pthread_sigmask(SIG_SETMASK, &earlier_mask_, nullptr);
+  }
+  SlotLock(const SlotLock&) = delete;
+  SlotLock& operator=(const SlotLock&) = delete;
+
+ private:
+  sigset_t earlier_mask_;
+};
+
+void begin_start(ChildSlot& slot) {
+  SlotLock lock;
+  starting = true;
+  if (slot.known) return;
+  slot.known = true;
+  slot.next = known_slots;
+  known_slots = &slot;
+}
+
+// Another thread's handler may have held the lock at the fork; it does not exist in the child.
+void free_lock_in_child() {
+  starting = false;
+  deferred_deliveries = 0;
+  slots_locked.clear(std::memory_order_release);
+}
+
+// Ends the start: stores the fork's result and returns how many deliveries waited for it.
+int end_start(ChildSlot& slot, pid_t result) {
+  SlotLock lock;
+  slot.pid = result;
+  slot.running = result > 0;
+  starting = false;
+  int deferred = deferred_deliveries;
+  deferred_deliveries = 0;
+  return deferred;
+}
+
+// Reaps one child, if one has ended and its slot can be told; false when it is put off.
+bool reap_one(pid_t* reaped) {
+  SlotLock lock;
+  if (starting) {
+    ++deferred_deliveries;
+    return false;
+  }
+  int status;
+  *reaped = waitpid(-1, &status, WNOHANG);
+  if (*reaped <= 0) return true;
+  for (ChildSlot* slot = known_slots; slot != nullptr; slot = slot->next) {
+    if (slot->pid == *reaped) slot->running = false;
+  }
+  return true;
+}
+
+void deliver() {
+  pid_t reaped = 0;
+  if (!reap_one(&reaped)) return;
+  log_error("corvexd: stop_logcat : %d, pid = %d\n", stop_logcat.load(), reaped);
+}
+
+}  // namespace
+
+void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument) {
+  begin_start(slot);
+  local_time_mutex.lock();
+  pid_t result = fork();
+  local_time_mutex.unlock();
+  if (result == 0) {
+    free_lock_in_child();
+    body(argument);
+    _exit(1);
+  }
+  for (int deferred = end_start(slot, result); deferred > 0; --deferred) deliver();
+}
+
+void exec_program(const char* path, const char* const* arguments) {
+  execv(path, const_cast<char* const*>(arguments));
+  _exit(1);
+}
+
+void terminate_child(ChildSlot& slot) {
+  SlotLock lock;
+  if (slot.running) kill(slot.pid, SIGTERM);
+}
+
+void forget_child(ChildSlot& slot) {
+  SlotLock lock;
+  slot.pid = 0;
+  slot.running = false;
+}
+
+void sig_chld_handler(int signal) {
+  int saved_errno = errno;
+  log_debug("corvexd: in function %s\n", __func__);
+  if (signal == SIGCHLD) {
+    log_debug("corvexd: in function %s, and receive signal %d\n", __func__, signal);
+    deliver();
+  }
+  errno = saved_errno;
+}
+
+void handle_ended_children() { signal(SIGCHLD, sig_chld_handler); }
+
+}  // namespace corvexd

@@ -1,0 +1,75 @@
+#include "capture/recorders.h"
+
+#include <cutils/properties.h>
+#include <string.h>
+
+#include "capture/capture_state.h"
+#include "capture/logcat_vector.h"
+#include "core/log.h"
+#include "core/settings.h"
+#include "core/state.h"
+#include "storage/capture_paths.h"
+
+namespace corvexd {
+namespace {
+
+constexpr LogcatJob kMainAndSystem = {
+    android_logsize, android_lognum, {"system", "main", "crash"}, true};
+constexpr LogcatJob kMainOnly = {android_logsize, android_lognum, {"main", "crash"}, true};
+constexpr LogcatJob kSystemOnly = {android_logsize, android_lognum, {"system", "crash"}, true};
+constexpr LogcatJob kRadio = {radio_logsize, radio_lognum, {"radio"}, true};
+constexpr LogcatJob kEvents = {event_logsize, event_lognum, {"events"}, true};
+constexpr LogcatJob kKernel = {kernel_logsize, kernel_lognum, {"kernel"}, false};
+
+void run_android(const CaptureSwitches& switches) {
+  const LogcatJob& job = !switches.system ? kMainOnly
+                         : switches.main  ? kMainAndSystem
+                                          : kSystemOnly;
+  exec_logcat(job, android_log_path.get().c_str());
+}
+
+void run_radio(const CaptureSwitches&) { exec_logcat(kRadio, radio_log_path.get().c_str()); }
+
+void run_events(const CaptureSwitches&) { exec_logcat(kEvents, event_log_path.get().c_str()); }
+
+void run_kernel(const CaptureSwitches&) {
+  log_info("corvexd: kernel_pid");
+  exec_logcat(kKernel, kernel_log_path.get().c_str());
+}
+
+void run_tcpdump(const CaptureSwitches&) {
+  const Path path = tcpdump_path.get();
+  const char* user = isInDataPartition ? "system" : "root";
+  const char* arguments[] = {"tcpdump",       "-i", "any",          "-p", "-s",         "0",  "-C",
+                             tcpdump_logsize, "-W", tcpdump_lognum, "-w", path.c_str(), "-Z", user,
+                             nullptr};
+  exec_program("/system/xbin/tcpdump", arguments);
+}
+
+}  // namespace
+
+const Recorder kRecorders[kRecorderCount] = {
+    {{"persist.sys.main", "persist.sys.system"}, &android_pid, run_android, {}},
+    {{"persist.sys.radio"}, &radio_pid, run_radio, {}},
+    {{"persist.sys.event"}, &event_pid, run_events, {}},
+    {{"persist.sys.kernel"}, &kernel_pid, run_kernel, {&kernel_to_fd, &kernel_from_fd}},
+    {{"persist.sys.tcpdump"}, &tcpdump_pid, run_tcpdump, {}},
+    {{"persist.sys.qsee"}, &qsee_pid, nullptr, {&qsee_from_fd, &qsee_to_fd}},
+    {{"persist.sys.tz"}, &tz_pid, nullptr, {&tz_from_fd, &tz_to_fd}},
+    {{"persist.sys.bootloader"},
+     &bootloader_pid,
+     nullptr,
+     {&bootloader_from_fd, &bootloader_to_fd}},
+    {{"persist.sys.pre_bootloader"},
+     &pre_bootloader_pid,
+     nullptr,
+     {&pre_bootloader_from_fd, &pre_bootloader_to_fd}},
+};
+
+bool switched_on(const char* property) {
+  char value[PROPERTY_VALUE_MAX];
+  property_get(property, value, "no");
+  return strcmp(value, "yes") == 0;
+}
+
+}  // namespace corvexd

@@ -1,0 +1,18 @@
+// The control socket: its set-up, its framing, its command loop.
+#pragma once
+
+namespace corvexd {
+
+// Reads exactly `count` bytes into `buffer`, however they arrive. Returns 0, or -1 (logged) when
+// the stream ends or fails first; -1 at once for a negative count.
+int readx(int fd, void* buffer, int count);
+
+// Puts the socket that init handed over into listening state and returns its descriptor. Ends the
+// process with status 1 when there is none or it cannot listen.
+int open_control_socket();
+
+// Serves one client after another, one command after another, on the calling (main) thread, for
+// the rest of the process's life.
+[[noreturn]] void serve_clients(int listening_socket);
+
+}  // namespace corvexd

@@ -1,0 +1,22 @@
+// Local time for the names of directories and files.
+#pragma once
+
+#include <time.h>
+
+#include <mutex>
+
+#include "core/path_buffer.h"
+
+namespace corvexd {
+
+using Timestamp = PathBuffer<100>;
+
+// The current local time as "%Y-%m-%d-%H-%M-%S". Any thread; in a child started by start_child too.
+Timestamp local_timestamp();
+
+// The C library keeps its time zone under a lock that a fork copies as it stands. Whoever forks a
+// child that reads the local time holds this mutex meanwhile, so that no other thread is inside.
+// Every use of the local time goes through local_timestamp, which takes it.
+extern std::mutex local_time_mutex;
+
+}  // namespace corvexd

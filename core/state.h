@@ -1,0 +1,35 @@
+// Where logs are written: the process-wide location state that every room reads.
+#pragma once
+
+#include <stdint.h>
+
+#include <atomic>
+
+#include "core/path_buffer.h"
+#include "core/published_path.h"
+
+namespace corvexd {
+
+// The log root, the directory under which log directories are made, and the prefix of every log
+// directory's path below it. Both point to constant strings and name the same root.
+extern std::atomic<const char*> LOG_ROOT;
+extern std::atomic<const char*> LOG_PATH;
+
+// 1 while the log root lies in the data partition; then everything the daemon creates under it is
+// given to the system user.
+extern std::atomic<uint8_t> isInDataPartition;
+
+// The cache log directory, with its trailing "/".
+extern std::atomic<const char*> cache_path;
+
+// The current log directory, without a trailing "/"; empty until the first one is made.
+extern PublishedPath LOG_DIR;
+
+// Where the main thread composes paths under the cache log directory.
+extern Path cache_file_path;
+
+// Chooses the log root anew from its two properties. Main thread. What runs already keeps writing
+// where it was started.
+void checkLogPath();
+
+}  // namespace corvexd

@@ -1,0 +1,132 @@
+#include "storage/log_directory.h"
+
+#include <android-base/unique_fd.h>
+#include <cutils/properties.h>
+#include <errno.h>
+#include <fcntl.h>
+#include <stdio.h>
+#include <string.h>
+#include <unistd.h>
+
+#include "core/files.h"
+#include "core/local_time.h"
+#include "core/log.h"
+#include "core/path_buffer.h"
+#include "core/state.h"
+#include "storage/copy.h"
+#include "storage/mkdirs.h"
+
+using android::base::unique_fd;
+
+namespace corvexd {
+namespace {
+
+constexpr char kCurrentMark[] = "_current";
+constexpr char kDirectoryMark[] = "KVBR_";
+constexpr mode_t kVersionFileMode = 0600;
+
+void remove_mark(const char* name) {
+  size_t kept = strlen(name) - strlen(kCurrentMark);
+  Path old_path = Path().append(LOG_ROOT).append("/").append(name);
+  Path new_path = Path().append(LOG_ROOT).append("/").append(name, kept);
+  if (!old_path.fits_or_log()) return;
+  log_info("corvexd: NEW IS %s \n", new_path.c_str());
+  log_info("corvexd: OLD IS %s \n", old_path.c_str());
+  if (rename(old_path.c_str(), new_path.c_str()) == 0) {
+    log_info("corvexd: RENAME SUCCESSFULL!");
+  } else {
+    log_error("corvexd: Rename failed! Error: %s\n", strerror(errno));
+  }
+  log_info("corvexd: NEW PATH IS %s\n", new_path.c_str());
+}
+
+int count_log_directories(const Directory& root) {
+  int count = 0;
+  while (struct dirent* entry = next_entry(root)) {
+    if (strstr(entry->d_name, kDirectoryMark) != nullptr && is_directory(root, *entry)) ++count;
+  }
+  return count;
+}
+
+// The path of the log directory to be made now.
+Path next_log_directory() {
+  Timestamp time = local_timestamp();
+  Path path = Path().append(LOG_PATH);
+  Directory root = open_directory(LOG_ROOT);
+  if (root) {
+    int number = count_log_directories(root) + 1;
+    log_error("corvexd: dir count is %d \n", number);
+    path.append_format("%d--", number);
+  } else {
+    path.append("1--");
+    log_error("corvexd: pdir is null! \n");
+  }
+  return path.append(time.c_str()).append(kCurrentMark);
+}
+
+[[noreturn]] void end_process() { _exit(1); }
+
+// Opens the version file of the log directory and writes the build's name, a property value with
+// the rest of its buffer. The file stays open until the markers are copied.
+unique_fd write_version(const Path& directory) {
+  Path path = Path(directory).append("/versionNumber");
+  log_info("corvexd: vn is %s \n", path.c_str());
+  char version[PROPERTY_VALUE_MAX] = {};
+  property_get("ro.build.ota.versionname", version, "");
+  unique_fd fd(open_with_mode(path.c_str(), O_WRONLY, kVersionFileMode));
+  if (fd == -1) {
+    log_error("corvexd: Open %s Error：%s\n", path.c_str(), strerror(errno));
+    end_process();
+  }
+  give_to_system(fd);
+  for (size_t done = 0; done < sizeof version;) {
+    ssize_t count = TEMP_FAILURE_RETRY(write(fd, version + done, sizeof version - done));
+    if (count <= 0) {
+      log_error("corvexd: bytes_write is -1, versionNumber is existing now! Error: %s \n",
+                strerror(errno));
+      end_process();
+    }
+    done += count;
+  }
+  return fd;
+}
+
+void copy_marker(const Path& source, const Path& destination) {
+  if (access(source.c_str(), R_OK) == 0) copy_file(source.c_str(), destination.c_str());
+}
+
+}  // namespace
+
+void renameLastDirectoryName() {
+  Directory root = open_directory(LOG_ROOT);
+  if (!root) {
+    log_error("corvexd: Error: %s\n", strerror(errno));
+    return;
+  }
+  while (struct dirent* entry = next_entry(root)) {
+    if (!is_directory(root, *entry)) continue;
+    log_info("corvexd: DIR NAME : %s \n", entry->d_name);
+    if (strstr(entry->d_name, kCurrentMark) != nullptr) remove_mark(entry->d_name);
+  }
+}
+
+int createLogDirectory() {
+  cache_file_path.clear().append(cache_path).append("fileAfter911");
+  const Path after_source = cache_file_path;
+  cache_file_path.clear().append(cache_path).append("fileBefore911");
+  const Path before_source = cache_file_path;
+
+  const Path directory = next_log_directory();
+  LOG_DIR.set(directory);
+  log_info("corvexd: log dir is %s \n", directory.c_str());
+  mkdirs(directory.c_str());
+  give_to_system(directory.c_str());
+
+  unique_fd version_file = write_version(directory);
+  copy_marker(after_source, Path(directory).append("/fileAfter911"));
+  copy_marker(before_source, Path(directory).append("/fileBefore911"));
+  version_file.reset();
+  return mkdirs(Path(directory).append("/boot_log").c_str());
+}
+
+}  // namespace corvexd

@@ -1,0 +1,52 @@
+#include "storage/mkdirs.h"
+
+#include <errno.h>
+#include <string.h>
+#include <unistd.h>
+
+#include "core/files.h"
+#include "core/log.h"
+
+namespace corvexd {
+namespace {
+
+constexpr int kWorkingSize = 512;
+constexpr mode_t kMode = 0755;
+
+bool create(const char* path) {
+  if (make_directory(path, kMode) != 0) {
+    log_error("corvexd: Directory create failed! Error: %s\n", strerror(errno));
+    return false;
+  }
+  log_info("corvexd: Log Directory created successfully, path is %s \n", path);
+  return true;
+}
+
+}  // namespace
+
+int mkdirs(const char* path) {
+  char working[kWorkingSize];
+  if (strlen(path) >= sizeof working) {
+    log_error("corvexd: too long, skipped: %s\n", path);
+    return -1;
+  }
+  strcpy(working, path);
+
+  // The first "/" is the root of an absolute path.
+  char* slash = strchr(working, '/');
+  if (slash != nullptr) slash = strchr(slash + 1, '/');
+  for (; slash != nullptr; slash = strchr(slash + 1, '/')) {
+    *slash = '\0';
+    if (access(working, F_OK) != 0) {
+      if (!create(working)) return -1;
+      if (give_to_system(working) != 0) log_info("corvexd: fail to chown, path is %s \n", working);
+    }
+    *slash = '/';
+  }
+  if (working[0] == '\0' || access(working, F_OK) == 0) return 0;
+  if (!create(working)) return -1;
+  give_to_system(working);
+  return 0;
+}
+
+}  // namespace corvexd
