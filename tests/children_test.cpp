@@ -1,0 +1,182 @@
+#include "capture/children.h"
+
+#include <signal.h>
+#include <stdlib.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <set>
+#include <sstream>
+#include <thread>
+
+#include "core/local_time.h"
+#include "core/log.h"
+#include "tests/daemon.h"
+#include "tests/device_root.h"
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+using Children = DeviceTest;
+
+#ifdef CORVEX_SANITIZED
+constexpr bool kSanitized = true;
+#else
+constexpr bool kSanitized = false;
+#endif
+
+ChildSlot slots[4];
+
+void end_at_once(const void*) {}
+
+void live(const void*) {
+  while (true) pause();
+}
+
+// What the daemon's own readers and samplers may do before they end.
+void work_and_end(const void*) {
+  for (int i = 0; i < 20; ++i) free(malloc(64 << (i % 12)));
+  log_debug("%s\n", local_timestamp().c_str());
+}
+
+// Makes a process with exactly this number in the pid namespace of the test.
+pid_t start_bystander(pid_t number) {
+  write_file("/proc/sys/kernel/ns_last_pid", std::to_string(number - 1));
+  pid_t pid = fork();
+  if (pid == 0) live(nullptr);
+  return pid;
+}
+
+bool is_running(pid_t pid) {
+  int status;
+  return waitpid(pid, &status, WNOHANG) == 0;
+}
+
+TEST_F(Children, NoSignalReachesARecycledNumber) {
+  handle_ended_children();
+  start_child(slots[0], end_at_once, nullptr);
+  const pid_t number = slots[0].pid;
+  ASSERT_TRUE(log.has("corvexd: stop_logcat : 1, pid = " + std::to_string(number) + "\n"));
+  signal(SIGCHLD, SIG_DFL);
+  pid_t bystander = start_bystander(number);
+  ASSERT_EQ(number, bystander);
+  terminate_child(slots[0]);
+  usleep(100'000);
+  EXPECT_TRUE(is_running(bystander));
+  EXPECT_EQ(number, slots[0].pid) << "a slot keeps its number";
+  kill(bystander, SIGKILL);
+  waitpid(bystander, nullptr, 0);
+
+  handle_ended_children();
+  start_child(slots[0], live, nullptr);
+  terminate_child(slots[0]);
+  EXPECT_TRUE(log.has("corvexd: stop_logcat : 1, pid = " + std::to_string(slots[0].pid) + "\n"));
+  log.clear();
+  sig_chld_handler(SIGUSR1);
+  EXPECT_TRUE(log.has("corvexd: in function sig_chld_handler\n"));
+  EXPECT_EQ(1u, log.texts().size());
+}
+
+TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
+  handle_ended_children();
+  std::atomic<bool> done{false};
+  std::vector<std::thread> threads;
+  for (int i = 0; i < 3; ++i) {
+    threads.emplace_back([&done, i] {
+      unsigned size = 1;
+      while (!done) {
+        size = size * 1103515245 + 12345;
+        free(malloc(size % 70'000));
+        if (i == 1 && size % 64 == 0) local_timestamp();
+        if (i == 2 && size % 64 == 0) log_debug("busy\n");
+      }
+    });
+  }
+  constexpr int kRounds = 200;
+  std::set<pid_t> started;
+  for (int round = 0; round < kRounds; ++round) {
+    ChildSlot& slot = slots[round % 4];
+    terminate_child(slot);
+    start_child(slot, round % 2 == 0 ? work_and_end : end_at_once, nullptr);
+    ASSERT_GT(slot.pid, 0);
+    started.insert(slot.pid);
+  }
+  done = true;
+  for (std::thread& thread : threads) thread.join();
+  signal(SIGCHLD, SIG_DFL);
+  // Every child was either reaped by the handler, and its slot knows, or is there to be reaped now.
+  while (true) {
+    pid_t pid = waitpid(-1, nullptr, 0);
+    if (pid < 0) break;
+    EXPECT_EQ(1u, started.count(pid));
+  }
+}
+
+struct Usage {
+  size_t descriptors, threads, zombies;
+  long kilobytes;
+};
+
+Usage usage_of(pid_t pid) {
+  const std::string proc = "/proc/" + std::to_string(pid);
+  Usage usage = {list(proc + "/fd").size(), list(proc + "/task").size(), 0, 0};
+  std::string status = read_file(proc + "/status");
+  usage.kilobytes = atol(status.c_str() + status.find("VmRSS:") + 6);
+  std::istringstream children(read_file(proc + "/task/" + std::to_string(pid) + "/children"));
+  for (std::string child; children >> child;) {
+    std::string state = read_file("/proc/" + child + "/stat");
+    if (state.find(") Z ") != std::string::npos) ++usage.zombies;
+  }
+  return usage;
+}
+
+// The number of different children that the handler says it has reaped.
+size_t reaped_children(LogCatcher& log) {
+  std::set<std::string> numbers;
+  for (const std::string& text : log.texts()) {
+    size_t at = text.find(", pid = ");
+    if (at != std::string::npos && isdigit(text[at + 8]) && text[at + 8] != '0') {
+      numbers.insert(text.substr(at + 8));
+    }
+  }
+  return numbers.size();
+}
+
+TEST_F(Children, TwoHundredCapturesLeaveNothingBehind) {
+  write_file("/system/bin/getprop", "#!/bin/sh\n");
+  run("chmod 755 /system/bin/getprop");
+  for (const char* name : {"main", "radio", "event", "kernel", "tcpdump"}) {
+    set_property(std::string("persist.sys.") + name, "yes");
+  }
+  Daemon daemon;
+  send_commands({"LOGSTOP"});
+  // The thread sanitizer adds one of its own beside the first thread that is started.
+  const size_t idle_threads = usage_of(daemon.pid()).threads + (kSanitized ? 1 : 0);
+  Usage before = {};
+  for (int round = 0; round < 200; ++round) {
+    const char* modes[] = {"die", "live", "live", "stubborn"};
+    install_probes(modes[round % 4]);
+    send_commands({"LOGBEGIN", "LOGSTOP"});
+    if (round == 19) before = usage_of(daemon.pid());
+  }
+  run("pkill -KILL 'logcat|tcpdump'");
+  Usage after;
+  // One wait a delivery, and deliveries merge: what the handler has not reaped yet are zombies.
+  eventually([&] {
+    after = usage_of(daemon.pid());
+    return after.threads <= idle_threads && reaped_children(log) + after.zombies >= 200u * 5;
+  });
+  EXPECT_LE(after.threads, idle_threads);
+  EXPECT_GE(reaped_children(log) + after.zombies, 200u * 5);
+  EXPECT_LE(after.descriptors, before.descriptors);
+  EXPECT_EQ(200u, list("/data/corvex").size());
+  // A sanitizer keeps what was released for a while.
+  long allowed = kSanitized ? 100'000 : 256;
+  EXPECT_LT(after.kilobytes, before.kilobytes + allowed);
+  send_commands({"CHANGEPATH"});
+}
+
+}  // namespace
+}  // namespace corvexd::test

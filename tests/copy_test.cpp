@@ -1,0 +1,114 @@
+#include "storage/copy.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "core/state.h"
+#include "storage/earlier_logs.h"
+#include "tests/device_root.h"
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+class Copy : public DeviceTest {
+ protected:
+  Copy() {
+    run("mkdir -p /data/log /data/from");
+    LOG_DIR.set(Path().append("/data/log"));
+    umask(077);
+  }
+};
+
+TEST_F(Copy, AppendsWithTheFilesMode) {
+  std::string content(3000, 'a');
+  content += '\0';
+  write_file("/data/from/a", content);
+  EXPECT_EQ(1, copy_file("/data/from/a", "/data/log/a"));
+  EXPECT_EQ(1, copy_file("/data/from/a", "/data/log/a"));
+  EXPECT_EQ(content + content, read_file("/data/log/a"));
+  EXPECT_EQ(0644u, mode_of("/data/log/a")) << "whatever the umask";
+  EXPECT_EQ(077u, umask(077)) << "the umask is the children's too";
+  EXPECT_TRUE(log.has("corvexd: copy_file /data/from/a '/data/log/a'"));
+  EXPECT_TRUE(log.has("corvexd: copy_file '/data/log/a'"));
+  if (!owners_work()) GTEST_SKIP() << "owners cannot be set without root";
+  EXPECT_TRUE(is_systems("/data/log/a"));
+}
+
+TEST_F(Copy, SaysWhatCouldNotBeOpened) {
+  EXPECT_EQ(-1, copy_file("/data/from/none", "/data/log/b"));
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/from/none"));
+  EXPECT_EQ("", read_file("/data/log/b"));
+  EXPECT_TRUE(exists("/data/log/b")) << "the destination is opened before the source is judged";
+  EXPECT_EQ(-1, copy_file("/data/log/b", "/data/log"));
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/log"));
+  EXPECT_EQ(-1, copy_file("/data/none", "/none/c"));
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/none, /none/c"));
+}
+
+TEST_F(Copy, NeverWaitsForAFifo) {
+  mkfifo("/data/from/fifo", 0600);
+  EXPECT_EQ(1, copy_file("/data/from/fifo", "/data/log/fifo"));
+  int both_ends = open("/data/from/fifo", O_RDWR);
+  ASSERT_EQ(4, write(both_ends, "text", 4));
+  EXPECT_EQ(1, copy_file("/data/from/fifo", "/data/log/fifo"));
+  EXPECT_EQ("text", read_file("/data/log/fifo"));
+  close(both_ends);
+  mkfifo("/data/log/sink", 0600);
+  EXPECT_EQ(-1, copy_file("/data/log/fifo", "/data/log/sink"));
+}
+
+TEST_F(Copy, AFullDiskLosesOnlyTheCopy) {
+  write_file("/data/from/a", std::string(5000, 'a'));
+  EXPECT_EQ(1, copy_file("/data/from/a", "/dev/full"));
+  EXPECT_TRUE(log.has("corvexd: copy_file '/dev/full'"));
+}
+
+TEST_F(Copy, FolderTakesEveryPlainFileWhateverItsName) {
+  const std::vector<std::string> names = {" blank ", "-rf", "line\nend", std::string(180, 'n')};
+  for (const std::string& name : names) write_file("/data/from/" + name, name);
+  run("mkdir /data/from/dir && echo x > /data/from/dir/x");
+  ASSERT_EQ(0, symlink("dir", "/data/from/link_to_dir"));
+  ASSERT_EQ(0, symlink(" blank ", "/data/from/link_to_file"));
+  ASSERT_EQ(0, symlink("gone", "/data/from/dangling"));
+  write_file("/data/from/" + std::string(255, 'z'), "does not fit");
+  std::string folder = "/data/from/";
+  copy_folder(folder.data(), "/sub/");
+  std::vector<std::string> expected = names;
+  expected.push_back("link_to_file");
+  std::sort(expected.begin(), expected.end());
+  EXPECT_EQ(expected, list("/data/log/sub"));
+  for (const std::string& name : names) EXPECT_EQ(name, read_file("/data/log/sub/" + name));
+  EXPECT_EQ(0777u, mode_of("/data/log/sub"));
+  EXPECT_TRUE(log.has("corvexd : copy folder /data/from/ : /sub/"));
+  EXPECT_EQ(1u, log.count("too long"));
+  if (!owners_work()) GTEST_SKIP() << "owners cannot be set without root";
+  EXPECT_TRUE(is_systems("/data/log/sub"));
+}
+
+TEST_F(Copy, FolderWithoutSourceOrDestinationMakesNothing) {
+  copy_folder("/data/none/", "/sub/");
+  EXPECT_FALSE(exists("/data/log/sub"));
+  LOG_DIR.set(Path().append("/data/gone"));
+  copy_folder("/data/from/", "/sub/");
+  EXPECT_TRUE(log.has("corvexd: fail to mkdir"));
+}
+
+TEST_F(Copy, EarlierLogsLandInTheirFolders) {
+  run("mkdir -p /cache/log_before_initial /cache/lkmsg /data/anr /data/system/dropbox");
+  write_file("/cache/log_before_initial/android_initial.log", "initial");
+  write_file("/cache/lkmsg/last", "kernel");
+  write_file("/data/anr/same", "trace");
+  write_file("/data/system/dropbox/same", "entry");
+  write_file("/data/system/dropbox/other", "entry");
+  copy_file_already_exist(nullptr);
+  EXPECT_EQ((std::vector<std::string>{"anr", "kmsg", "log_before_initial"}), list("/data/log"));
+  EXPECT_EQ("initial", read_file("/data/log/log_before_initial/android_initial.log"));
+  EXPECT_EQ("kernel", read_file("/data/log/kmsg/last"));
+  EXPECT_EQ("traceentry", read_file("/data/log/anr/same"));
+  EXPECT_EQ("entry", read_file("/data/log/anr/other"));
+}
+
+}  // namespace
+}  // namespace corvexd::test

@@ -1,0 +1,127 @@
+#include <cutils/properties.h>
+#include <signal.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <thread>
+
+#include "core/local_time.h"
+#include "core/path_buffer.h"
+#include "core/pause.h"
+#include "core/published_path.h"
+#include "core/settings.h"
+#include "core/state.h"
+#include "tests/device_root.h"
+
+namespace corvexd::test {
+namespace {
+
+using Core = DeviceTest;
+
+TEST_F(Core, PathBufferKnowsWhatDidNotFit) {
+  PathBuffer<8> buffer;
+  EXPECT_TRUE(buffer.append("1234").append("567").fits());
+  EXPECT_FALSE(buffer.append("8").fits());
+  EXPECT_STREQ("1234567", buffer.c_str());
+  EXPECT_FALSE(buffer.append("").fits()) << "a cut text never fits again";
+  EXPECT_TRUE(buffer.clear().append_format("%d", 1234567).fits());
+  EXPECT_FALSE(buffer.clear().append("a").append_format("%s", "1234567").fits());
+  EXPECT_STREQ("a123456", buffer.c_str());
+}
+
+TEST_F(Core, PublishedPathIsNeverAMixture) {
+  PublishedPath path;
+  EXPECT_STREQ("", path.get().c_str());
+  std::atomic<bool> done{false};
+  std::thread reader([&] {
+    while (!done) {
+      std::string text = path.get().c_str();
+      for (char c : text) ASSERT_EQ(text[0], c) << text;
+    }
+  });
+  for (int i = 0; i < 20'000; ++i) {
+    path.set(Path().append(std::string(i % 200, static_cast<char>('a' + i % 26)).c_str()));
+  }
+  done = true;
+  reader.join();
+}
+
+TEST_F(Core, PauseLastsThoughSignalsInterruptIt) {
+  signal(SIGALRM, [](int) {});
+  struct itimerspec often = {{0, 1'000'000}, {0, 1'000'000}};
+  timer_t timer;
+  struct sigevent event = {};
+  event.sigev_notify = SIGEV_SIGNAL;
+  event.sigev_signo = SIGALRM;
+  ASSERT_EQ(0, timer_create(CLOCK_MONOTONIC, &event, &timer));
+  timer_settime(timer, 0, &often, nullptr);
+  struct timespec start, end;
+  clock_gettime(CLOCK_MONOTONIC, &start);
+  pause_seconds(1);
+  clock_gettime(CLOCK_MONOTONIC, &end);
+  timer_delete(timer);
+  EXPECT_GE((end.tv_sec - start.tv_sec) * 1000 + (end.tv_nsec - start.tv_nsec) / 1'000'000, 1000);
+}
+
+TEST_F(Core, SettingsComeFromTheirPropertiesOrDefaults) {
+  set_property("persist.sys.lograw", std::string(91, 'x'));
+  set_property("persist.sys.loglevel", "");
+  set_property("persist.sys.maskothers", "1234567");
+  set_property("persist.sys.radio.lognum", "12345678");
+  set_property("persist.sys.tcpdump.logsize", "007");
+  loadSettings();
+  EXPECT_EQ(std::string(91, 'x'), lograw);
+  EXPECT_STREQ("*:V", loglevel);
+  EXPECT_STREQ("1234567", maskothers);
+  EXPECT_STREQ("5", radio_lognum) << "a number that does not fit is refused, not cut";
+  EXPECT_STREQ("007", tcpdump_logsize);
+  EXPECT_STREQ("30", android_lognum);
+  EXPECT_STREQ("20480", kernel_logsize);
+  EXPECT_STREQ("3", tcpdump_lognum);
+  EXPECT_TRUE(
+      log.has("corvexd: persist.sys.radio.lognum is too long, \"5\" is used instead of "
+              "\"12345678\"\n"));
+}
+
+TEST_F(Core, LogRootFollowsItsTwoProperties) {
+  struct {
+    const char* watchdog;
+    const char* path;
+    bool in_data;
+  } rows[] = {{"", "", true},      {"false", "data", true}, {"true", "data", false},
+              {"", "Data", false}, {"", "data ", false},    {"false", "sdcard", false}};
+  for (const auto& row : rows) {
+    set_property("sys.debug.watchdog", row.watchdog);
+    set_property("persist.sys.corvex.path", row.path);
+    checkLogPath();
+    std::string root = row.in_data ? "/data/corvex" : "/storage/emulated/0/corvex";
+    EXPECT_EQ(root, LOG_ROOT.load()) << row.watchdog << row.path;
+    EXPECT_EQ(root + "/KVBR_", LOG_PATH.load());
+    EXPECT_EQ(row.in_data, isInDataPartition == 1);
+    EXPECT_TRUE(log.has("corvexd LOG_ROOT : " + root + "\n"));
+  }
+  EXPECT_TRUE(log.has("corvexd watchdogProp : false, log_path : data  \n"));
+}
+
+TEST_F(Core, TimestampIsLocalTime) {
+  setenv("TZ", "XYZ-5:30", 1);
+  tzset();
+  time_t now;
+  std::string stamp;
+  do {
+    now = time(nullptr);
+    stamp = local_timestamp().c_str();
+  } while (time(nullptr) != now);
+  now += (5 * 60 + 30) * 60;
+  struct tm expected;
+  gmtime_r(&now, &expected);
+  char text[64];
+  strftime(text, sizeof text, "%Y-%m-%d-%H-%M-%S", &expected);
+  EXPECT_EQ(text, stamp);
+  unsetenv("TZ");
+  tzset();
+}
+
+}  // namespace
+}  // namespace corvexd::test

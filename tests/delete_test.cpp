@@ -1,0 +1,45 @@
+#include "storage/delete.h"
+
+#include <sys/mount.h>
+#include <unistd.h>
+
+#include "tests/device_root.h"
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+using Delete = DeviceTest;
+
+TEST_F(Delete, EmptiesTheRootAndNothingElse) {
+  run("mkdir -p /data/corvex/KVBR_1/anr /data/corvex/KVBR_2_current/boot_log /data/outside");
+  run("touch /data/corvex/KVBR_1/anr/trace '/data/corvex/-rf \n' /data/outside/kept");
+  ASSERT_EQ(0, symlink("/data/outside", "/data/corvex/KVBR_1/link"));
+  ASSERT_EQ(0, symlink("/data/gone", "/data/corvex/dangling"));
+  EXPECT_EQ(0, deleteLog("/data/corvex/"));
+  EXPECT_TRUE(list("/data/corvex").empty());
+  EXPECT_TRUE(exists("/data/outside/kept"));
+  EXPECT_EQ(-1, deleteLog("/data/none"));
+  EXPECT_TRUE(log.has("corvexd: opendir /data/none  No such file or directory \n "));
+  EXPECT_EQ(0, remove_file("/data/none")) << "gone is what was asked for";
+  EXPECT_TRUE(log.has("corvexd: can't stat '/data/none' No such file or directory "));
+}
+
+TEST_F(Delete, GoesOnPastWhatCannotBeRemoved) {
+  run("mkdir -p /data/corvex/a/read_only /data/corvex/b/mounted && touch /data/corvex/a/file");
+  ASSERT_EQ(0, mount("x", "/data/corvex/a/read_only", "tmpfs", MS_RDONLY, nullptr));
+  ASSERT_EQ(0, mount("x", "/data/corvex/b/mounted", "tmpfs", 0, nullptr));
+  EXPECT_EQ(0, deleteLog("/data/corvex"));
+  EXPECT_EQ((std::vector<std::string>{"a", "b"}), list("/data/corvex"));
+  EXPECT_EQ((std::vector<std::string>{"read_only"}), list("/data/corvex/a"));
+  EXPECT_TRUE(log.has("corvexd: descend into directory '/data/corvex/a/read_only'? "));
+  EXPECT_TRUE(log.has("corvexd: can't remove '/data/corvex/a'"));
+  EXPECT_TRUE(log.has("corvexd: can't remove '/data/corvex/b/mounted'"));
+  EXPECT_TRUE(log.has("corvexd: can't remove '/data/corvex/b'"));
+  EXPECT_EQ(-1, remove_file("/data/corvex/b"));
+  umount("/data/corvex/a/read_only");
+  umount("/data/corvex/b/mounted");
+}
+
+}  // namespace
+}  // namespace corvexd::test

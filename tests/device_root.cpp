@@ -1,0 +1,106 @@
+#include "tests/device_root.h"
+
+#include <fcntl.h>
+#include <sched.h>
+#include <signal.h>
+#include <sys/mount.h>
+#include <sys/prctl.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+bool entered_as_root;
+
+void check(bool good, const char* what) {
+  if (good) return;
+  perror(what);
+  _exit(1);
+}
+
+void map_to_root(uid_t uid, gid_t gid) {
+  write_file("/proc/self/setgroups", "deny");
+  write_file("/proc/self/uid_map", "0 " + std::to_string(uid) + " 1");
+  write_file("/proc/self/gid_map", "0 " + std::to_string(gid) + " 1");
+}
+
+void bind_mount(const std::string& source, const std::string& target) {
+  check(mount(source.c_str(), target.c_str(), nullptr, MS_BIND | MS_REC, nullptr) == 0,
+        target.c_str());
+}
+
+void make_root(const std::string& root) {
+  check(mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0, "private mounts");
+  check(mount("root", root.c_str(), "tmpfs", 0, "mode=0755") == 0, "tmpfs");
+  for (const char* directory : {"/usr", "/build", "/proc", "/dev", "/etc", "/tmp"}) {
+    mkdir((root + directory).c_str(), 0755);
+  }
+  for (const char* link : {"bin", "lib", "lib64", "sbin"}) {
+    check(symlink((std::string("usr/") + link).c_str(), (root + "/" + link).c_str()) == 0, link);
+  }
+  bind_mount("/usr", root + "/usr");
+  bind_mount(CORVEX_BUILD_DIR, root + "/build");
+  check(mount("proc", (root + "/proc").c_str(), "proc", 0, nullptr) == 0, "proc");
+  for (const char* device : {"null", "zero", "full", "urandom", "kmsg"}) {
+    write_file(root + "/dev/" + device, "");
+    bind_mount(std::string("/dev/") + device, root + "/dev/" + device);
+  }
+  write_file(root + "/etc/passwd", "root:x:0:0::/:/bin/sh\nsystem:x:1000:1000::/:/bin/sh\n");
+  write_file(root + "/etc/group", "root:x:0:\nsystem:x:1000:\n");
+  check(chroot(root.c_str()) == 0 && chdir("/") == 0, "chroot");
+}
+
+// Waits for every child that is left to this process; returns the status of `pid`.
+int wait_for_all(pid_t pid) {
+  int status;
+  for (pid_t ended; (ended = wait(&status)) != pid;) check(ended > 0, "wait");
+  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+void empty_directory(const std::string& path) { run("rm -rf " + path + " && mkdir -p " + path); }
+
+}  // namespace
+
+void enter_device_root() {
+  uid_t uid = getuid();
+  gid_t gid = getgid();
+  entered_as_root = uid == 0;
+  char root[] = "/tmp/corvex-test-XXXXXX";
+  check(mkdtemp(root) != nullptr, root);
+  check(unshare(CLONE_NEWNS | CLONE_NEWPID | (entered_as_root ? 0 : CLONE_NEWUSER)) == 0,
+        "unshare");
+  if (!entered_as_root) map_to_root(uid, gid);
+  if (pid_t init = fork(); init != 0) {
+    int status = wait_for_all(init);
+    rmdir(root);
+    _exit(status);
+  }
+  prctl(PR_SET_PDEATHSIG, SIGKILL);
+  make_root(root);
+  if (pid_t tests = fork(); tests != 0) _exit(wait_for_all(tests));
+}
+
+bool owners_work() { return entered_as_root; }
+
+DeviceTest::DeviceTest() {
+  for (const char* path : {"/data", "/cache", "/storage", "/system", "/vendor", "/probe",
+                           "/dev/socket", "/dev/__properties__"}) {
+    empty_directory(path);
+  }
+  run("mkdir -p /data/corvex /storage/emulated/0 /system/bin /system/xbin");
+  log.start();
+}
+
+void set_property(const std::string& key, const std::string& value) {
+  write_file("/dev/draft", value);
+  rename("/dev/draft", ("/dev/__properties__/" + key).c_str());
+}
+
+}  // namespace corvexd::test

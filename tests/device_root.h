@@ -1,0 +1,31 @@
+// A device root of the test's own, and the fixture of the tests that live in one.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "tests/log_catcher.h"
+
+namespace corvexd::test {
+
+// Moves the calling process into new mount and pid namespaces (without root, a user namespace too)
+// and a fresh device root on a tmpfs, with the host's /usr and the build folder at /build, both
+// read-only. Returns in a child whose exit status the first process ends with.
+void enter_device_root();
+
+// Whether files can be given to other users here: not without root.
+bool owners_work();
+
+// An empty device: its directories, no property set, its log caught.
+class DeviceTest : public testing::Test {
+ protected:
+  DeviceTest();
+
+  LogCatcher log;
+};
+
+// As whoever sets properties on a device does it: replaced whole, by rename.
+void set_property(const std::string& key, const std::string& value);
+
+}  // namespace corvexd::test
