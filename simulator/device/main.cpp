@@ -1,0 +1,32 @@
+// corvex-device: starts a simulated device and runs commands in it.
+#include <errno.h>
+#include <limits.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/stat.h>
+
+#include "simulator/device/commands.h"
+
+int main(int argc, char** argv) {
+  char root[PATH_MAX];
+  bool boots = argc >= 3 && strcmp(argv[1], "boot") == 0;
+  bool runs = argc >= 4 && strcmp(argv[1], "exec") == 0;
+  bool quiet = boots && argc == 4 && strcmp(argv[3], "--quiet") == 0;
+  if ((boots && (argc == 3 || quiet)) || runs) {
+    if (boots && mkdir(argv[2], 0755) != 0 && errno != EEXIST) {
+      fprintf(stderr, "corvex-device: %s: %m\n", argv[2]);
+      return 1;
+    }
+    if (realpath(argv[2], root) == nullptr) {
+      fprintf(stderr, "corvex-device: %s: %m\n", argv[2]);
+      return runs ? 125 : 1;
+    }
+    return boots ? corvexd::sim::boot_device(root, quiet)
+                 : corvexd::sim::run_in_device(root, &argv[3]);
+  }
+  fprintf(stderr,
+          "usage: corvex-device boot ROOT [--quiet]\n"
+          "       corvex-device exec ROOT COMMAND [ARGUMENT]...\n");
+  return 2;
+}
