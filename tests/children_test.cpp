@@ -35,9 +35,14 @@ void live(const void*) {
   while (true) pause();
 }
 
+void allocate(size_t size) {
+  void* volatile memory = malloc(size);  // volatile: or the pair is optimised away
+  free(memory);
+}
+
 // What the daemon's own readers and samplers may do before they end.
 void work_and_end(const void*) {
-  for (int i = 0; i < 20; ++i) free(malloc(64 << (i % 12)));
+  for (int i = 0; i < 20; ++i) allocate(64 << (i % 12));
   log_debug("%s\n", local_timestamp().c_str());
 }
 
@@ -88,12 +93,19 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
       unsigned size = 1;
       while (!done) {
         size = size * 1103515245 + 12345;
-        free(malloc(size % 70'000));
+        allocate(size % 70'000);
         if (i == 1 && size % 64 == 0) local_timestamp();
         if (i == 2 && size % 64 == 0) log_debug("busy\n");
       }
     });
   }
+  // The signal comes to every thread, at any moment.
+  std::thread storm([&] {
+    for (size_t i = 0; !done; ++i) {
+      pthread_kill(threads[i % threads.size()].native_handle(), SIGCHLD);
+      usleep(100);
+    }
+  });
   constexpr int kRounds = 200;
   std::set<pid_t> started;
   for (int round = 0; round < kRounds; ++round) {
@@ -104,6 +116,7 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
     started.insert(slot.pid);
   }
   done = true;
+  storm.join();
   for (std::thread& thread : threads) thread.join();
   signal(SIGCHLD, SIG_DFL);
   // Every child was either reaped by the handler, and its slot knows, or is there to be reaped now.
@@ -132,17 +145,40 @@ Usage usage_of(pid_t pid) {
   return usage;
 }
 
-// The number of different children that the handler says it has reaped.
+// How often the handler says it has reaped a child.
 size_t reaped_children(LogCatcher& log) {
-  std::set<std::string> numbers;
+  size_t count = 0;
   for (const std::string& text : log.texts()) {
     size_t at = text.find(", pid = ");
-    if (at != std::string::npos && isdigit(text[at + 8]) && text[at + 8] != '0') {
-      numbers.insert(text.substr(at + 8));
+    if (at != std::string::npos && atoi(text.c_str() + at + 8) > 0) ++count;
+  }
+  return count;
+}
+
+// From now on the lowest free numbers are given out again.
+void reuse_numbers() { write_file("/proc/sys/kernel/ns_last_pid", "300"); }
+
+// Processes that take the numbers of ended recorders, and die of any signal that was meant for one.
+class Bystanders {
+ public:
+  Bystanders() {
+    reuse_numbers();
+    for (pid_t& pid : pids_) {
+      pid = fork();
+      if (pid == 0) live(nullptr);
     }
   }
-  return numbers.size();
-}
+  ~Bystanders() {
+    for (pid_t pid : pids_) {
+      EXPECT_TRUE(is_running(pid)) << "a signal reached a wrong process";
+      kill(pid, SIGKILL);
+      waitpid(pid, nullptr, 0);
+    }
+  }
+
+ private:
+  pid_t pids_[20];
+};
 
 TEST_F(Children, TwoHundredCapturesLeaveNothingBehind) {
   write_file("/system/bin/getprop", "#!/bin/sh\n");
@@ -156,9 +192,12 @@ TEST_F(Children, TwoHundredCapturesLeaveNothingBehind) {
   const size_t idle_threads = usage_of(daemon.pid()).threads + (kSanitized ? 1 : 0);
   Usage before = {};
   for (int round = 0; round < 200; ++round) {
-    const char* modes[] = {"die", "live", "live", "stubborn"};
+    const char* modes[] = {"die", "live", "brief", "stubborn"};
     install_probes(modes[round % 4]);
-    send_commands({"LOGBEGIN", "LOGSTOP"});
+    reuse_numbers();
+    send_commands({"LOGBEGIN"});
+    Bystanders bystanders;
+    send_commands({"LOGSTOP"});
     if (round == 19) before = usage_of(daemon.pid());
   }
   run("pkill -KILL 'logcat|tcpdump'");

@@ -38,7 +38,8 @@ struct ProbeReport {
   std::vector<std::string> rest;  // its signals and descriptors
 };
 
-// Puts the probe at the recorders' paths, in the given mode: "live", "die" or "stubborn".
+// Puts the probe at the recorders' paths, in the given mode: "live", "die" at once, "brief" (end
+// after some milliseconds) or "stubborn" (ignore SIGTERM).
 void install_probes(const std::string& mode);
 
 // Every report so far, in the order of the process numbers, after waiting for `count` of them.

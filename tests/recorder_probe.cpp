@@ -49,6 +49,10 @@ int main(int argc, char** argv) {
   fclose(report);
   rename(draft, path);
 
+  if (strcmp(mode, "brief") == 0) {
+    usleep(getpid() % 16 * 1000);
+    return 0;
+  }
   while (strcmp(mode, "die") != 0) pause();
   return 0;
 }
