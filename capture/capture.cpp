@@ -24,6 +24,7 @@ struct RecorderStart {
 
 void run_recorder(const void* argument) {
   const auto& start = *static_cast<const RecorderStart*>(argument);
+  if (start.recorder->reader != nullptr) return run_node_reader(*start.recorder->reader);
   start.recorder->run(*start.switches);
 }
 

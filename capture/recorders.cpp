@@ -5,6 +5,7 @@
 
 #include "capture/capture_state.h"
 #include "capture/logcat_vector.h"
+#include "capture/node_reader.h"
 #include "core/log.h"
 #include "core/settings.h"
 #include "core/state.h"
@@ -32,8 +33,9 @@ void run_radio(const CaptureSwitches&) { exec_logcat(kRadio, radio_log_path.get(
 
 void run_events(const CaptureSwitches&) { exec_logcat(kEvents, event_log_path.get().c_str()); }
 
-void run_kernel(const CaptureSwitches&) {
+void run_kernel(const CaptureSwitches& switches) {
   log_info("corvexd: kernel_pid");
+  if (switches.kernel_kmsg) return cat_kernel_from_dev();
   exec_logcat(kKernel, kernel_log_path.get().c_str());
 }
 
@@ -49,20 +51,22 @@ void run_tcpdump(const CaptureSwitches&) {
 }  // namespace
 
 const Recorder kRecorders[kRecorderCount] = {
-    {{"persist.sys.main", "persist.sys.system"}, &android_pid, run_android, {}},
-    {{"persist.sys.radio"}, &radio_pid, run_radio, {}},
-    {{"persist.sys.event"}, &event_pid, run_events, {}},
-    {{"persist.sys.kernel"}, &kernel_pid, run_kernel, {&kernel_to_fd, &kernel_from_fd}},
-    {{"persist.sys.tcpdump"}, &tcpdump_pid, run_tcpdump, {}},
-    {{"persist.sys.qsee"}, &qsee_pid, nullptr, {&qsee_from_fd, &qsee_to_fd}},
-    {{"persist.sys.tz"}, &tz_pid, nullptr, {&tz_from_fd, &tz_to_fd}},
+    {{"persist.sys.main", "persist.sys.system"}, &android_pid, run_android, nullptr, {}},
+    {{"persist.sys.radio"}, &radio_pid, run_radio, nullptr, {}},
+    {{"persist.sys.event"}, &event_pid, run_events, nullptr, {}},
+    {{"persist.sys.kernel"}, &kernel_pid, run_kernel, nullptr, {&kernel_to_fd, &kernel_from_fd}},
+    {{"persist.sys.tcpdump"}, &tcpdump_pid, run_tcpdump, nullptr, {}},
+    {{"persist.sys.qsee"}, &qsee_pid, nullptr, &kQseeReader, {&qsee_from_fd, &qsee_to_fd}},
+    {{"persist.sys.tz"}, &tz_pid, nullptr, &kTzReader, {&tz_from_fd, &tz_to_fd}},
     {{"persist.sys.bootloader"},
      &bootloader_pid,
      nullptr,
+     &kBootloaderReader,
      {&bootloader_from_fd, &bootloader_to_fd}},
     {{"persist.sys.pre_bootloader"},
      &pre_bootloader_pid,
      nullptr,
+     &kPreBootloaderReader,
      {&pre_bootloader_from_fd, &pre_bootloader_to_fd}},
 };
 

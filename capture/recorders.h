@@ -4,6 +4,7 @@
 #include <stdint.h>
 
 #include "capture/children.h"
+#include "capture/node_reader.h"
 
 namespace corvexd {
 
@@ -17,7 +18,8 @@ struct CaptureSwitches {
 struct Recorder {
   const char* switches[2];  // properties; on when any of them is "yes"
   ChildSlot* slot;
-  void (*run)(const CaptureSwitches& switches);  // the child's body
+  void (*run)(const CaptureSwitches& switches);  // the child's body, or
+  const NodeReader* reader;                      // the reader that the child is
   int32_t* descriptors[2];                       // closed in this order before the child is ended
 };
 

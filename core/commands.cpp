@@ -6,11 +6,13 @@
 #include <unistd.h>
 
 #include "capture/capture.h"
+#include "capture/children.h"
 #include "core/log.h"
 #include "core/state.h"
 #include "storage/capture_paths.h"
 #include "storage/delete.h"
 #include "storage/log_directory.h"
+#include "thermal/thermal_sampler.h"
 
 namespace corvexd {
 namespace {
@@ -24,6 +26,10 @@ void begin_capture(int) {
 }
 
 void end_capture(int) { stopLogcat(); }
+
+void start_sampler(int) { getCpuxThermal(); }
+
+void stop_sampler(int) { terminate_child(cpu_thermal_pid); }
 
 void answer(int connection, const char* reply) {
   size_t left = strlen(reply);
@@ -60,8 +66,8 @@ constexpr Command kCommands[] = {
     {"LOGSTOP", end_capture},
     {"CACHECLEAR", nullptr},
     {"BUGREPORT", nullptr},
-    {"CPUTHERMAL", nullptr},
-    {"STOPCPUTHERMAL", nullptr},
+    {"CPUTHERMAL", start_sampler},
+    {"STOPCPUTHERMAL", stop_sampler},
     {"DELETELOG", delete_logs},
     {"OEM_BT_DEBUG_ENABLE", nullptr},
     {"OEM_BT_DEBUG_DISABLE", nullptr},

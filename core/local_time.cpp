@@ -4,16 +4,19 @@ namespace corvexd {
 
 std::mutex local_time_mutex;
 
-Timestamp local_timestamp() {
-  char text[100];
+struct tm local_time() {
   time_t now = time(nullptr);
   struct tm local = {};
-  {
-    std::lock_guard<std::mutex> lock(local_time_mutex);
-    localtime_r(&now, &local);
-    strftime(text, sizeof text, "%Y-%m-%d-%H-%M-%S", &local);
-  }
-  return Timestamp().append(text);
+  std::lock_guard<std::mutex> lock(local_time_mutex);
+  localtime_r(&now, &local);
+  return local;
+}
+
+Timestamp local_timestamp() {
+  struct tm now = local_time();
+  return Timestamp().append_format("%d-%02d-%02d-%02d-%02d-%02d", now.tm_year + 1900,
+                                   now.tm_mon + 1, now.tm_mday, now.tm_hour, now.tm_min,
+                                   now.tm_sec);
 }
 
 }  // namespace corvexd

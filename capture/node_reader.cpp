@@ -1,0 +1,142 @@
+#include "capture/node_reader.h"
+
+#include <errno.h>
+#include <fcntl.h>
+#include <string.h>
+#include <unistd.h>
+
+#include "capture/rotation.h"
+#include "core/files.h"
+#include "core/log.h"
+
+namespace corvexd {
+namespace {
+
+constexpr size_t kBlockSize = 1024;
+constexpr mode_t kOutputMode = 0600;
+
+struct Counters {
+  int64_t total = 0;
+  int count = 0;
+};
+
+[[noreturn]] void fail_to_open(const NodeReader& reader, const char* path) {
+  log_error(reader.texts.open_failed, path, strerror(errno));
+  _exit(1);
+}
+
+void open_output(const NodeReader& reader, const char* path) {
+  *reader.to_fd = open_with_mode(path, O_WRONLY, kOutputMode);
+  if (*reader.to_fd == -1) fail_to_open(reader, path);
+}
+
+void open_both(const NodeReader& reader, const char* output) {
+  if (access(reader.source, R_OK) != 0) {
+    log_error(reader.texts.source_unreadable, strerror(errno));
+    if (reader.needs_readable_source) _exit(1);
+  }
+  int access_mode = reader.erases_source ? O_RDWR : O_RDONLY;
+  *reader.from_fd = open(reader.source, access_mode | O_CLOEXEC);
+  if (*reader.from_fd == -1) fail_to_open(reader, reader.source);
+  open_output(reader, output);
+  give_to_system(output);
+}
+
+// A file that has been removed under the reader takes the bytes of its last write along.
+void replace_lost_output(const NodeReader& reader, const char* path) {
+  if (access(path, reader.appends_when_reopened ? F_OK : R_OK) == 0) return;
+  log_error(reader.texts.output_gone, path, errno, strerror(errno));
+  close(*reader.to_fd);
+  open_output(reader, path);
+  if (reader.appends_when_reopened && lseek(*reader.to_fd, 0, SEEK_END) == -1) {
+    log_error("corvexd: lseek failed! %s\n", strerror(errno));
+    _exit(1);
+  }
+}
+
+void rotate_when_due(const NodeReader& reader, const char* path, Counters* counters, int written) {
+  counters->total += written;
+  if (reader.rotation_size == nullptr) return;
+  int64_t size = reader.rotation_size();
+  if (size <= 0 || counters->total / size <= counters->count) return;
+  ++counters->count;
+  close(*reader.to_fd);
+  shift_series(path, counters->count, reader.owns_rotated_files);
+  *reader.to_fd = open_with_mode(path, O_WRONLY, kOutputMode);
+  if (*reader.to_fd == -1) {
+    log_error(reader.texts.reopen_failed, path, strerror(errno));
+    _exit(1);
+  }
+  log_debug(reader.texts.rotated, static_cast<long long>(counters->total), counters->count);
+}
+
+void copy_block(const NodeReader& reader, const char* path, const char* block, size_t size,
+                Counters* counters) {
+  while (size > 0) {
+    ssize_t written = write(*reader.to_fd, block, size);
+    int error = errno;
+    replace_lost_output(reader, path);
+    if (written == -1) {
+      log_error(reader.texts.write_failed, strerror(error));
+      return;
+    }
+    if (written == 0) continue;
+    block += written;
+    size -= written;
+    rotate_when_due(reader, path, counters, static_cast<int>(written));
+  }
+}
+
+void copy_source(const NodeReader& reader, const char* path) {
+  Counters counters;
+  // Not NUL, so that the line says what happened when nothing has been read at all.
+  char block[kBlockSize] = {'\xff'};
+  for (int reads = 0; reader.max_reads == 0 || reads < reader.max_reads; ++reads) {
+    ssize_t size = read(*reader.from_fd, block, sizeof block);
+    if (reader.erases_source && block[0] == '\0') {
+      log_error("%s", reader.texts.empty_block);
+      return;
+    }
+    if (size == 0) {
+      if (reader.texts.end_of_source != nullptr) log_error("%s", reader.texts.end_of_source);
+      if (reader.at_end == AtEnd::kStop) return;
+      continue;
+    }
+    if (size == -1) {
+      log_error(reader.texts.read_failed, strerror(errno));
+      return;
+    }
+    copy_block(reader, path, block, size, &counters);
+  }
+}
+
+void erase_source(const NodeReader& reader) {
+  const char zeros[kBlockSize] = {};
+  lseek(*reader.from_fd, 0, SEEK_SET);
+  for (int i = 0; i < reader.max_reads; ++i) {
+    if (write(*reader.from_fd, zeros, sizeof zeros) == -1) {
+      log_error(reader.texts.write_failed, strerror(errno));
+      return;
+    }
+  }
+}
+
+}  // namespace
+
+void run_node_reader(const NodeReader& reader) {
+  const Path output = reader.output->get();
+  open_both(reader, output.c_str());
+  copy_source(reader, output.c_str());
+  if (reader.erases_source) erase_source(reader);
+}
+
+void cat_kernel_from_dev() { run_node_reader(kKernelReader); }
+
+void rotateKernelLog(int64_t* total, int* count, int written) {
+  Counters counters = {*total, *count};
+  rotate_when_due(kKernelReader, kKernelReader.output->get().c_str(), &counters, written);
+  *total = counters.total;
+  *count = counters.count;
+}
+
+}  // namespace corvexd

@@ -1,0 +1,63 @@
+// The daemon's own readers: children that copy a log node of the kernel or the firmware into a
+// capture file. One copy loop and one rotation; what differs between the readers is data.
+#pragma once
+
+#include <stdint.h>
+
+#include "core/published_path.h"
+
+namespace corvexd {
+
+enum class AtEnd { kReadAgain, kStop };
+
+// Formats take their arguments in the order given; a text that has no use for the last ones leaves
+// them out. Null: nothing is logged.
+struct NodeTexts {
+  const char* source_unreadable;  // error text
+  const char* open_failed;        // path, error text
+  const char* reopen_failed;      // after a rotation: path, error text
+  const char* read_failed;        // error text
+  const char* end_of_source;
+  const char* empty_block;
+  const char* output_gone;   // path, error number, error text
+  const char* write_failed;  // error text
+  const char* rotated;       // bytes written, number of rotations
+};
+
+struct NodeReader {
+  const char* source;
+  const PublishedPath* output;
+  int32_t* from_fd;
+  int32_t* to_fd;
+  bool needs_readable_source;  // ends when access(2) denies it; else the open decides
+  AtEnd at_end;                // of the source
+  int max_reads;               // 0: without limit
+  bool erases_source;          // stops at a block that starts with NUL, and zeroes the source's
+                               // first max_reads blocks when it has read
+  int64_t (*rotation_size)();  // bytes; null, zero or less: no rotation
+  bool owns_rotated_files;     // gives them to the system user
+  bool appends_when_reopened;
+  NodeTexts texts;
+};
+
+// Runs one reader in the calling child, which has no other thread and allocates nothing. Returns
+// when the reading has come to its end; the child then ends with status 1, as it does from inside
+// when a file cannot be opened.
+void run_node_reader(const NodeReader& reader);
+
+// The kernel log's reader and the four firmware logs'.
+extern const NodeReader kKernelReader;
+extern const NodeReader kQseeReader;
+extern const NodeReader kTzReader;
+extern const NodeReader kBootloaderReader;
+extern const NodeReader kPreBootloaderReader;
+
+// The kernel log's reader.
+void cat_kernel_from_dev();
+
+// Adds `written` bytes to the kernel log's *total and, when that has passed one more multiple of
+// its size limit, shifts the series of files by one suffix, begins a fresh file and counts the
+// rotation in *count. In the reader's child.
+void rotateKernelLog(int64_t* total, int* count, int written);
+
+}  // namespace corvexd

@@ -1,0 +1,16 @@
+// The current log directory as the log root shows it.
+#pragma once
+
+#include "core/path_buffer.h"
+
+namespace corvexd {
+
+// Normally one directory bears the mark; when there are more, jobs differ in which one they take.
+enum class WhichMark { kFirst, kLast };  // in the order of the listing
+
+// Sets *path to the directory under LOG_ROOT whose name holds "_current". Any thread. False, with
+// *path untouched, when there is none, the root cannot be opened (errno says why) or the path does
+// not fit.
+bool find_current_directory(WhichMark which, Path* path);
+
+}  // namespace corvexd
