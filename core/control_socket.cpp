@@ -56,7 +56,7 @@ int readx(int fd, void* buffer, int count) {
       return -1;
     }
     next += got;
-    left -= got;
+    left -= static_cast<int>(got);
   }
   return 0;
 }

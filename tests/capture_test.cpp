@@ -79,13 +79,16 @@ TEST_F(Capture, SwitchesCountOnlyWhenExactlyYes) {
     started += row.buffers.empty() ? 0 : 1;
     std::vector<ProbeReport> reports = probe_reports(started);
     send_commands({"LOGSTOP"});
+    ASSERT_EQ(started, reports.size());
     if (row.buffers.empty()) continue;
     const Texts& arguments = reports.back().arguments;
     EXPECT_EQ(row.buffers, Texts(arguments.begin() + 7, arguments.end() - 4));
   }
   switch_on({"tcpdump"});
   send_commands({"LOGBEGIN"});
-  EXPECT_EQ("root", probe_reports(started + 1).back().arguments.back());
+  std::vector<ProbeReport> reports = probe_reports(started + 1);
+  ASSERT_EQ(started + 1, reports.size());
+  EXPECT_EQ("root", reports.back().arguments.back());
   EXPECT_EQ(
       0u,
       current_directory("/storage/emulated/0/corvex").find("/storage/emulated/0/corvex/KVBR_4--"));
@@ -99,6 +102,7 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
   Daemon daemon;
   send_commands({"LOGSTOP", "LOGBEGIN"});
   std::vector<ProbeReport> first = probe_reports(3);
+  ASSERT_EQ(3u, first.size());
   const std::string first_directory = current_directory();
   set_property("persist.sys.main", "no");
   switch_on({"system"});
@@ -110,6 +114,7 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
   switch_on({"event"});
   send_commands({"LOGBEGIN"});
   std::vector<ProbeReport> second = probe_reports(6);
+  ASSERT_EQ(6u, second.size());
   send_commands({"LOGSTOP"});
   EXPECT_TRUE(eventually([&] { return ended(second[5].pid); }));
   EXPECT_TRUE(alive(first[2].pid)) << "the slot names the second capture's recorder";

@@ -95,7 +95,7 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
         size = size * 1103515245 + 12345;
         allocate(size % 70'000);
         if (i == 1 && size % 64 == 0) local_timestamp();
-        if (i == 2 && size % 64 == 0) log_debug("busy\n");
+        if (i == 2 && size % 4096 == 0) log_debug("busy\n");
       }
     });
   }
@@ -103,7 +103,7 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   std::thread storm([&] {
     for (size_t i = 0; !done; ++i) {
       pthread_kill(threads[i % threads.size()].native_handle(), SIGCHLD);
-      usleep(100);
+      usleep(500);
     }
   });
   constexpr int kRounds = 200;

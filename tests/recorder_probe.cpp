@@ -6,8 +6,6 @@
 #include <string.h>
 #include <unistd.h>
 
-extern char** environ;
-
 namespace {
 
 void report_signals(FILE* report) {

@@ -68,7 +68,7 @@ __attribute__((constructor)) void fill_base_properties() {
 int property_get(const char* key, char* value, const char* default_value) {
   int length = read_value(key, value);
   if (length > 0 || default_value == nullptr) return length;
-  length = strnlen(default_value, PROPERTY_VALUE_MAX - 1);
+  length = static_cast<int>(strnlen(default_value, PROPERTY_VALUE_MAX - 1));
   memcpy(value, default_value, length);
   value[length] = '\0';
   return length;
