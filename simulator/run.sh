@@ -49,11 +49,16 @@ until grep -q "device ready" "$build/device.out"; do
 done
 grep "^corvex-device" "$build/device.err" || true
 
-for recorder in main system radio event kernel tcpdump; do
+for recorder in main system radio event kernel tcpdump qsee tz bootloader pre_bootloader; do
     in_device setprop "persist.sys.$recorder" yes
 done
+# The kernel's records as they are, where they can be had.
+in_device test -r /dev/kmsg && raw=yes || raw=no
+in_device setprop persist.sys.kernel.kmsg "$raw"
 send LOGBEGIN
+send CPUTHERMAL
 in_device bash -s "$show" "$seconds" <"$here/show/input.sh"
+send STOPCPUTHERMAL
 send LOGSTOP
 in_device bash -s "$show" "$seconds" "$root" "$(id -u)" <"$here/show/report.sh" ||
     fail "the capture is not complete"

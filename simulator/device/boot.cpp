@@ -64,7 +64,8 @@ std::string build_folder() {
   if (ready == kReadyFd) fcntl(ready, F_SETFD, 0);
   if (ready != kReadyFd) dup2(ready, kReadyFd);
   close_range(kReadyFd + 1, ~0u, 0);
-  const char* const arguments[] = {"/init", nullptr};
+  // The nodes are there before the first program that looks for them.
+  const char* const arguments[] = {"/system/bin/make_nodes", "/init", nullptr};
   execve(arguments[0], const_cast<char**>(arguments), const_cast<char**>(kDeviceEnvironment));
   report_failure(arguments[0]);
   _exit(1);

@@ -97,6 +97,8 @@ constexpr struct {
     {"simulator/corvex-toolbox", "system/bin/corvex-toolbox"},
     {"simulator/programs/bugreport", "system/bin/bugreport"},
     {"simulator/programs/dumpsys", "system/bin/dumpsys"},
+    {"simulator/programs/firmware", "system/bin/firmware"},
+    {"simulator/programs/make_nodes", "system/bin/make_nodes"},
     {"simulator/programs/pktlogconf", "vendor/bin/pktlogconf"},
     {"simulator/programs/iwpriv", "vendor/bin/iwpriv"},
     // The machine may allow its own tcpdump, by its path, to write only where a device does not.

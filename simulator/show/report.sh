@@ -12,18 +12,49 @@ complain() {
     missing=1
 }
 
-# check FILE BUFFER LINES: all lines from 1 to LINES stand in the file, once each and in order.
+# check FILE PATTERN LINES: the lines that match it are numbered, at their ends, from 1 to LINES:
+# they stand in the file once each and in order.
 check() {
     local found
-    found=$(awk -v text="$name $2 line " 'index($0, text) && $NF == n + 1 {n++} END {print n + 0}' "$1")
-    [ "$found" = "$3" ] || complain "$1 holds $found of $3 lines written to $2"
+    found=$(awk -v pattern="$2" '$0 ~ pattern && $NF == n + 1 {n++} END {print n + 0}' "$1")
+    [ "$found" = "$3" ] || complain "$1 holds $found of $3 lines with \"$2\""
 }
 
+# check_firmware NAME: everything in its log is in unbroken order, and there is at least a line for
+# each second.
+check_firmware() {
+    local lines
+    lines=$(wc -l <"$1.log")
+    check "$1.log" "^\\[ *[0-9.]+\\] $1: .*, event " "$lines"
+    [ "$lines" -ge "$seconds" ] || complain "$1.log has only $lines lines"
+}
+
+# The bootloader's partition held the text of seven starts, as much of it as fits 20 KiB, and what
+# has been read from there is erased.
+check_bootloader() {
+    local partition=/dev/block/platform/soc/624000.ufshc/by-name/reserve1
+    cmp bootloader.log /dev/nodes/proc/bootloader_log || complain "bootloader.log differs"
+    for _ in 1 2 3 4 5 6 7; do cat bootloader.log; done | head -c 20K | cmp - pre_bootloader.log ||
+        complain "pre_bootloader.log differs"
+    cmp -n 32K "$partition" /dev/zero || complain "$partition is not erased"
+}
+
+# At least a sample every four seconds, each with all frequencies and most zones; they change.
+check_thermal() {
+    awk -F ', ' -v samples=$((seconds / 4 + 1)) '
+        { values = 0; for (i = 2; i <= NF; i++) if ($i ~ /^[a-z_0-9]+=-?[0-9]+$/) values++ }
+        NF == 22 && /cpu0_freq=[0-9]+, .*, cpu3_freq=[0-9]+, / && values > 12 { good++ }
+        { sub(/[^,]*/, ""); if (!seen[$0]++) different++ }
+        END { exit !(NR >= samples && good == NR && different > 1) }' kv_tsen_data/* ||
+        complain "the thermal record is not as it should be"
+}
+
+# show_tail FILE [WIDTH]
 show_tail() {
     echo
     echo "== $1"
     # A fixed-size record ends in zero bytes, which no terminal wants.
-    tail -n 3 "$1" | tr -d '\0' | cut -c 1-160
+    tail -n 3 "$1" | tr -d '\0' | cut -c "1-${2:-160}"
 }
 
 show_packets() {
@@ -57,13 +88,21 @@ for file in *; do
     *) [ ! -f "$file" ] || [ ! -s "$file" ] || show_tail "$file" ;;
     esac
 done
+show_tail kv_tsen_data/* 1000
 show_packets
 
 echo
-for buffer in main system crash; do check android.log "$buffer" $((seconds * 5)); done
-check radio.log radio $((seconds * 5))
-check event.log events $((seconds * 5))
-[ ! -w /dev/kmsg ] || check kernel.log kernel "$seconds"
+for buffer in main system crash; do
+    check android.log "$name $buffer line" $((seconds * 5))
+done
+check radio.log "$name radio line" $((seconds * 5))
+check event.log "$name events line" $((seconds * 5))
+# The kernel's own records have numbers before their text.
+[ ! -w /dev/kmsg ] || check kernel.log "^[0-9]+,[0-9]+,[0-9]+,.*;$name kernel line" "$seconds"
+check_firmware qsee
+check_firmware tz
+check_bootloader
+check_thermal
 [ "$missing" = 0 ] || exit 1
 echo "every line written was recorded; the capture lies in"
 echo "$root$PWD"
