@@ -2,7 +2,8 @@
 # run.sh BUILD_DIR: what the daemon's jobs cost, on this machine and now. Prints the median of five
 # runs of each.
 set -euo pipefail
-driver=${1:?usage: run.sh BUILD_DIR}/bench/bench_driver
+build=${1:?usage: run.sh BUILD_DIR}
+driver=$build/bench/bench_driver
 mebibytes=256
 runs=5
 
@@ -21,3 +22,5 @@ for ((run = 0; run < runs; run++)); do reader_times; done | sort -n -k 2 |
   awk -v middle=$(((runs + 1) / 2)) -v mebibytes="$mebibytes" 'NR == middle {
     printf "reader, %d MiB in chunks of 1 KiB: user %.2f s, system %.2f s, user/system %.2f\n",
       mebibytes, $1, $2, $1 / $2 }'
+
+"$build/bench/boot_time"

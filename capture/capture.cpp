@@ -1,15 +1,13 @@
 #include "capture/capture.h"
 
-#include <pthread.h>
-#include <string.h>
 #include <unistd.h>
 
 #include "capture/capture_state.h"
 #include "capture/children.h"
 #include "capture/exec_shell.h"
 #include "capture/recorders.h"
-#include "core/log.h"
 #include "core/pause.h"
+#include "core/thread.h"
 #include "storage/earlier_logs.h"
 
 namespace corvexd {
@@ -26,16 +24,6 @@ void run_recorder(const void* argument) {
   const auto& start = *static_cast<const RecorderStart*>(argument);
   if (start.recorder->reader != nullptr) return run_node_reader(*start.recorder->reader);
   start.recorder->run(*start.switches);
-}
-
-void start_copy_of_earlier_logs() {
-  pthread_t thread;
-  int error = pthread_create(&thread, nullptr, copy_file_already_exist, nullptr);
-  if (error != 0) {
-    log_error("corvexd: no thread to copy earlier logs: %s\n", strerror(error));
-    return;
-  }
-  pthread_detach(thread);
 }
 
 // The two switches of the android recorder were read before the properties were dumped; every other
@@ -67,7 +55,7 @@ void executeLogcat() {
                                     switched_on("persist.sys.system"),
                                     switched_on("persist.sys.kernel.kmsg")};
   capture_running = 1;
-  start_copy_of_earlier_logs();
+  start_thread(copy_file_already_exist);
   exec_shell("getprop", "getprop.txt");
   for (const Recorder& recorder : kRecorders) {
     if (!starts(recorder, switches)) continue;

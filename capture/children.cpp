@@ -130,7 +130,7 @@ void terminate_child(ChildSlot& slot) {
 
 void forget_child(ChildSlot& slot) {
   SlotLock lock;
-  slot.pid = 0;
+  if (slot.pid > 0) slot.pid = 0;
   slot.running = false;
 }
 

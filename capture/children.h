@@ -29,7 +29,7 @@ void start_child(ChildSlot& slot, void (*body)(const void*), const void* argumen
 // another process. Any thread.
 void terminate_child(ChildSlot& slot);
 
-// Empties the slot; its child, if it runs, goes on unobserved. Any thread.
+// Empties a slot that names a child; that child, if it runs, goes on unobserved. Any thread.
 void forget_child(ChildSlot& slot);
 
 // The SIGCHLD handler: reaps one ended child, whichever, and logs it.

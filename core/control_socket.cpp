@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include "core/commands.h"
+#include "core/end.h"
 #include "core/log.h"
 
 namespace corvexd {
@@ -61,33 +62,35 @@ int readx(int fd, void* buffer, int count) {
   return 0;
 }
 
-int open_control_socket() {
+void open_control_socket() {
   int fd = android_get_control_socket(kSocketName);
   if (fd < 0) {
     log_error("Failed to get socket from environment: %s\n", strerror(errno));
-    _exit(1);
+    end_daemon();
   }
   if (listen(fd, kBacklog) != 0) {
     log_error("Listen on socket failed: %s\n", strerror(errno));
-    _exit(1);
+    end_daemon();
   }
   fcntl(fd, F_SETFD, FD_CLOEXEC);
-  return fd;
+  listening_socket = fd;
 }
 
-void serve_clients(int listening_socket) {
+void serve_clients() {
   for (;;) {
     int connection = accept4(listening_socket, nullptr, nullptr, SOCK_CLOEXEC);
     if (connection < 0) {
       log_error("Accept failed: %s\n", strerror(errno));
       continue;
     }
+    client_connection = connection;
     log_info("new connection\n");
     while (serve_message(connection)) {
     }
     log_info("closing connection\n");
     // Readers forked meanwhile hold a copy of the descriptor; the client is to see the end now.
     shutdown(connection, SHUT_RDWR);
+    client_connection = -1;
     close(connection);
   }
 }

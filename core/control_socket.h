@@ -7,12 +7,12 @@ namespace corvexd {
 // the stream ends or fails first; -1 at once for a negative count.
 int readx(int fd, void* buffer, int count);
 
-// Puts the socket that init handed over into listening state and returns its descriptor. Ends the
-// process with status 1 when there is none or it cannot listen.
-int open_control_socket();
+// Puts the socket that init handed over into listening state. Ends the process with status 1 when
+// there is none or it cannot listen.
+void open_control_socket();
 
 // Serves one client after another, one command after another, on the calling (main) thread, for
 // the rest of the process's life.
-[[noreturn]] void serve_clients(int listening_socket);
+[[noreturn]] void serve_clients();
 
 }  // namespace corvexd

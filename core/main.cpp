@@ -1,9 +1,29 @@
 #include "core/control_socket.h"
+#include "core/log.h"
 #include "core/settings.h"
+#include "core/startup.h"
 #include "core/state.h"
+#include "core/thread.h"
+#include "early/boot_log.h"
+#include "early/initial_log.h"
 
+// The start-up order: the boot recorders first, for the first lines of a boot are the ones that
+// matter; the data partition only when it can be used.
 int main() {
-  corvexd::loadSettings();
-  corvexd::checkLogPath();
-  corvexd::serve_clients(corvexd::open_control_socket());
+  using namespace corvexd;
+  log_info("corvexd main start\n");
+  choose_cache_directory();
+  const bool force_encrypted = data_is_force_encrypted();
+  log_info("corvexd firing up\n");
+  executeOnBootLogcat();
+  start_thread(stopLogAfterBoot);
+  wait_for_layout();
+  wait_for_data_partition(force_encrypted);
+  loadSettings();
+  checkLogPath();
+  execute911Logcat();
+  open_control_socket();
+  start_persistent_capture();
+  start_diagnostic_service();
+  serve_clients();
 }

@@ -8,6 +8,7 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "core/end.h"
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
@@ -64,8 +65,6 @@ Path next_log_directory() {
   return path.append(time.c_str()).append(kCurrentMark);
 }
 
-[[noreturn]] void end_process() { _exit(1); }
-
 // Opens the version file of the log directory and writes the build's name, a property value with
 // the rest of its buffer. The file stays open until the markers are copied.
 unique_fd write_version(const Path& directory) {
@@ -76,15 +75,16 @@ unique_fd write_version(const Path& directory) {
   unique_fd fd(open_with_mode(path.c_str(), O_WRONLY, kVersionFileMode));
   if (fd == -1) {
     log_error("corvexd: Open %s Error：%s\n", path.c_str(), strerror(errno));
-    end_process();
+    end_daemon();
   }
   give_to_system(fd);
   for (size_t done = 0; done < sizeof version;) {
     ssize_t count = TEMP_FAILURE_RETRY(write(fd, version + done, sizeof version - done));
-    if (count <= 0) {
+    if (count == 0) break;
+    if (count == -1) {
       log_error("corvexd: bytes_write is -1, versionNumber is existing now! Error: %s \n",
                 strerror(errno));
-      end_process();
+      end_daemon();
     }
     done += count;
   }

@@ -186,7 +186,7 @@ TEST_F(Children, TwoHundredCapturesLeaveNothingBehind) {
   for (const char* name : {"main", "radio", "event", "kernel", "tcpdump"}) {
     set_property(std::string("persist.sys.") + name, "yes");
   }
-  Daemon daemon;
+  Daemon daemon(log);
   send_commands({"LOGSTOP"});
   // The thread sanitizer adds one of its own beside the first thread that is started.
   const size_t idle_threads = usage_of(daemon.pid()).threads + (kSanitized ? 1 : 0);

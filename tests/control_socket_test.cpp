@@ -34,7 +34,7 @@ TEST_F(ControlSocket, ReadxReadsExactlyWhatWasAskedFor) {
 }
 
 TEST_F(ControlSocket, MessagesRunInOrderHoweverTheyArrive) {
-  Daemon daemon;
+  Daemon daemon(log);
   int fd = connect_to_daemon();
   std::string bytes = message("CHANGEPATH") + message(std::string("CHANGEPATH\0abc", 14)) +
                       message("changepath") + message("CHANGEPATH\n") +
@@ -45,8 +45,7 @@ TEST_F(ControlSocket, MessagesRunInOrderHoweverTheyArrive) {
   Texts texts = log.texts();
   Texts path = {"corvexd watchdogProp : false, log_path : data \n",
                 "corvexd LOG_ROOT : /data/corvex\n"};
-  Texts expected = path;  // from the daemon's start
-  expected.insert(expected.end(), {"new connection\n", "print buf--CHANGEPATH \n"});
+  Texts expected = {"new connection\n", "print buf--CHANGEPATH \n"};
   expected.insert(expected.end(), path.begin(), path.end());
   expected.push_back("print buf--CHANGEPATH \n");
   expected.insert(expected.end(), path.begin(), path.end());
@@ -68,10 +67,8 @@ TEST_F(ControlSocket, BadFramingClosesTheConnectionOnly) {
       {"\xff\xff", {"invalid size 65535\n"}},
       {message("CHANGEPATH").substr(0, 7), {"corvexd: eof\n", "failed to read command\n"}},
   };
-  Daemon daemon;
-  send_bytes("");
+  Daemon daemon(log);
   for (const auto& row : rows) {
-    ASSERT_TRUE(log.has("closing connection\n"));
     log.clear();
     send_bytes(row.bytes);
     ASSERT_TRUE(log.has("closing connection\n"));
@@ -83,7 +80,7 @@ TEST_F(ControlSocket, BadFramingClosesTheConnectionOnly) {
 }
 
 TEST_F(ControlSocket, DeletelogAnswersAndSurvivesAClientThatHasGone) {
-  Daemon daemon;
+  Daemon daemon(log);
   EXPECT_EQ("CLEANFAILED", send_commands({"DELETELOG"})) << "no shared-storage root";
   run("mkdir -p /storage/emulated/0/corvex/x /data/corvex/y");
   EXPECT_EQ("CLEANSUCCESS", send_commands({"DELETELOG"}));
@@ -106,7 +103,28 @@ TEST_F(ControlSocket, DeletelogAnswersAndSurvivesAClientThatHasGone) {
   EXPECT_TRUE(exists("/storage/emulated/0/corvex/x")) << "the second root waits for the first";
 }
 
+TEST_F(ControlSocket, ClientsSeeTheEndOfTheDaemonThoughItsReadersLiveOn) {
+  Daemon daemon(log);
+  run("mkdir -p /sys && rm -rf /data/corvex");
+  send_commands({"CPUTHERMAL"});
+  int second = connect_to_daemon();
+  const std::string begin = message("CPUTHERMAL");
+  ASSERT_EQ(static_cast<ssize_t>(begin.size()), write(second, begin.data(), begin.size()));
+  ASSERT_TRUE(eventually([&] { return log.count("cpu&thermal log path") == 2; }));
+  int waiting = connect_to_daemon();
+  run("rm -rf /data/corvex && touch /data/corvex");
+  const std::string fatal = message("LOGBEGIN");
+  ASSERT_EQ(static_cast<ssize_t>(fatal.size()), write(second, fatal.data(), fatal.size()));
+  char byte;
+  EXPECT_LE(read(second, &byte, 1), 0);
+  EXPECT_LE(read(waiting, &byte, 1), 0);
+  close(second);
+  close(waiting);
+}
+
 TEST_F(ControlSocket, WithoutASocketTheProcessEnds) {
+  make_device_ready();
+  install_probes("live");
   for (const char* number : {"", "77", "0"}) {
     pid_t child = fork();
     if (child == 0) {

@@ -10,6 +10,7 @@
 
 #include <sstream>
 
+#include "tests/device_root.h"
 #include "tests/files.h"
 
 namespace corvexd::test {
@@ -20,7 +21,7 @@ const struct sockaddr* address() { return reinterpret_cast<const struct sockaddr
 
 }  // namespace
 
-Daemon::Daemon(const char* program) {
+BootingDaemon::BootingDaemon(const char* program) {
   unlink(kAddress.sun_path);
   int fd = socket(AF_UNIX, SOCK_STREAM, 0);
   EXPECT_EQ(0, bind(fd, address(), sizeof kAddress));
@@ -37,9 +38,25 @@ Daemon::Daemon(const char* program) {
   close(fd);
 }
 
-Daemon::~Daemon() {
+BootingDaemon::~BootingDaemon() {
   kill(pid_, SIGKILL);
   waitpid(pid_, nullptr, 0);
+}
+
+void make_device_ready() {
+  write_file("/data/.layout_version", "3");
+  set_property("vold.internalSD.mount", "1");
+  write_file("/cache/fileAfter911", "");
+}
+
+// The probe is there already when this device starts its daemon.
+Daemon::Daemon(LogCatcher& log, const char* program)
+    : BootingDaemon((make_device_ready(), install_probes("live"), program)) {
+  close(connect_to_daemon());
+  probe_reports(4);
+  clear_probe_reports();
+  EXPECT_TRUE(log.has("closing connection\n"));
+  log.clear();
 }
 
 std::string message(const std::string& command) {
@@ -77,6 +94,8 @@ void install_probes(const std::string& mode) {
     EXPECT_EQ(0, symlink("/build/tests/recorder_probe", path));
   }
 }
+
+void clear_probe_reports() { run("rm -f /probe/report.*"); }
 
 std::vector<ProbeReport> probe_reports(size_t count) {
   const std::string prefix = "report.";

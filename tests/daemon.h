@@ -6,19 +6,31 @@
 #include <string>
 #include <vector>
 
+#include "tests/log_catcher.h"
+
 namespace corvexd::test {
 
 // Starts the daemon as init does, with its control socket; ends it with SIGKILL.
-class Daemon {
+class BootingDaemon {
  public:
-  explicit Daemon(const char* program = "/build/tests/corvexd_fast");
-  ~Daemon();
+  explicit BootingDaemon(const char* program = "/build/tests/corvexd_fast");
+  ~BootingDaemon();
 
   pid_t pid() const { return pid_; }
 
  private:
   pid_t pid_;
 };
+
+// A daemon on a device that is up and past its initial phase: it serves, its boot recorders live on
+// unobserved, and what was logged on the way is forgotten.
+class Daemon : public BootingDaemon {
+ public:
+  explicit Daemon(LogCatcher& log, const char* program = "/build/tests/corvexd_fast");
+};
+
+// Lets a start go through without waiting.
+void make_device_ready();
 
 // One message as it goes over the wire.
 std::string message(const std::string& command);
@@ -35,12 +47,15 @@ std::string send_commands(const std::vector<std::string>& commands);
 struct ProbeReport {
   pid_t pid;
   std::vector<std::string> arguments;
-  std::vector<std::string> rest;  // its signals and descriptors
+  std::vector<std::string> rest;  // its signals and descriptors, and last "started" and when
 };
 
 // Puts the probe at the recorders' paths, in the given mode: "live", "die" at once, "brief" (end
 // after some milliseconds) or "stubborn" (ignore SIGTERM).
 void install_probes(const std::string& mode);
+
+// Forgets every report so far.
+void clear_probe_reports();
 
 // Every report so far, in the order of the process numbers, after waiting for `count` of them.
 std::vector<ProbeReport> probe_reports(size_t count);

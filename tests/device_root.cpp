@@ -89,12 +89,16 @@ void enter_device_root() {
 
 bool owners_work() { return entered_as_root; }
 
-DeviceTest::DeviceTest() {
+void make_empty_device() {
   for (const char* path : {"/data", "/cache", "/storage", "/system", "/vendor", "/probe",
                            "/dev/socket", "/dev/__properties__"}) {
     empty_directory(path);
   }
   run("mkdir -p /data/corvex /storage/emulated/0 /system/bin /system/xbin");
+}
+
+DeviceTest::DeviceTest() {
+  make_empty_device();
   log.start();
 }
 

@@ -14,6 +14,9 @@ namespace corvexd::test {
 // read-only. Returns in a child whose exit status the first process ends with.
 void enter_device_root();
 
+// Makes the device in that root an empty one: its directories, no property set.
+void make_empty_device();
+
 // Whether files can be given to other users here: not without root.
 bool owners_work();
 

@@ -1,13 +1,32 @@
+// Time for tests: pauses of seconds last hundredths of it. The long ones are reported, and end when
+// the test says so: a file of that name appears.
 #include <errno.h>
+#include <fcntl.h>
+#include <stdio.h>
+#include <unistd.h>
 
 #include "core/pause.h"
 
 namespace corvexd {
+namespace {
 
-void pause_seconds(time_t seconds) {
-  struct timespec left = {0, seconds * 10'000'000};
+constexpr time_t kLong = 60;
+
+void sleep_for(long nanoseconds) {
+  struct timespec left = {0, nanoseconds};
   while (nanosleep(&left, &left) != 0 && errno == EINTR) {
   }
+}
+
+}  // namespace
+
+void pause_seconds(time_t seconds) {
+  if (seconds < kLong) return sleep_for(seconds * 10'000'000);
+  char started[64], end[64];
+  snprintf(started, sizeof started, "/probe/pause_%lld", static_cast<long long>(seconds));
+  snprintf(end, sizeof end, "/probe/end_pause_%lld", static_cast<long long>(seconds));
+  close(open(started, O_CREAT | O_WRONLY | O_CLOEXEC, 0600));
+  while (unlink(end) != 0) sleep_for(10'000'000);
 }
 
 }  // namespace corvexd

@@ -217,7 +217,7 @@ TEST_F(Reader, TheMachinesKernelLogIsCaptured) {
   if (kernel == -1 || !owners_work()) GTEST_SKIP() << "the kernel log needs root";
   set_property("persist.sys.kernel", "yes");
   set_property("persist.sys.kernel.kmsg", "yes");
-  Daemon daemon;
+  Daemon daemon(log);
   send_commands({"LOGBEGIN"});
   const std::string mark = "corvexd test line " + std::to_string(getpid());
   const std::string file = current_directory() + "/kernel.log";

@@ -4,6 +4,7 @@
 #include <signal.h>
 #include <stdio.h>
 #include <string.h>
+#include <time.h>
 #include <unistd.h>
 
 namespace {
@@ -27,6 +28,8 @@ void report_descriptors(FILE* report, const bool* inherited) {
 }  // namespace
 
 int main(int argc, char** argv) {
+  struct timespec started;
+  clock_gettime(CLOCK_MONOTONIC, &started);
   bool inherited[64];
   for (int fd = 0; fd < 64; ++fd) inherited[fd] = fcntl(fd, F_GETFD) != -1;
   char mode[16] = "live";
@@ -44,6 +47,7 @@ int main(int argc, char** argv) {
   for (int i = 0; i < argc; ++i) fprintf(report, "arg %s\n", argv[i]);
   report_signals(report);
   report_descriptors(report, inherited);
+  fprintf(report, "started %lld\n", started.tv_sec * 1'000'000'000LL + started.tv_nsec);
   fclose(report);
   rename(draft, path);
 

@@ -46,7 +46,7 @@ TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
   set_source(zone(12), "41");
   run("mkdir -p " + zone(16));  // a source that opens and cannot be read
   run("mkdir -p /data/corvex/KVBR_9_current && touch /data/corvex/A_current");
-  Daemon daemon;
+  Daemon daemon(log);
   EXPECT_EQ("", send_commands({"CPUTHERMAL"}));
   const std::string directory = "/data/corvex/KVBR_9_current/kv_tsen_data";
   EXPECT_TRUE(log.has("corvexd: cpu&thermal log path is " + directory + "/ \n"));
@@ -72,7 +72,7 @@ TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
 }
 
 TEST_F(Thermal, StopEndsTheLatestSamplerOnly) {
-  Daemon daemon;
+  Daemon daemon(log);
   send_commands({"STOPCPUTHERMAL", "CPUTHERMAL"});
   const std::string directory = current_directory() + "/kv_tsen_data";
   EXPECT_EQ(0u, directory.find("/data/corvex/KVBR_1--")) << "made, as there was none";

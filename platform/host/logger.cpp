@@ -1,6 +1,8 @@
 // The Android log on Linux: every line goes as one datagram to the log daemon's socket.
 #include <android/log.h>
 #include <errno.h>
+#include <poll.h>
+#include <signal.h>
 #include <stdio.h>
 #include <string.h>
 #include <sys/socket.h>
@@ -16,15 +18,18 @@ namespace {
 
 constexpr char kTag[] = "corvexd";
 constexpr size_t kMaxPayload = 4068;  // priority, tag and NUL, text and NUL together
-constexpr time_t kFullQueueWait = 1;  // seconds
 
 // Everything below may run inside a signal handler and in a child just forked, beside other
-// threads: no lock, no allocation, nothing but this descriptor and this flag shared. The socket
-// stays unconnected, so that each line finds the log daemon of its moment.
-std::atomic<int> log_socket{-1};
+// threads: no lock, no allocation, nothing shared but these. The sockets stay unconnected, so that
+// each line finds the log daemon of its moment. A datagram queue holds only a few lines; the kernel
+// waits for room in a full one, at the first socket for a second, at the second for a moment.
+std::atomic<int> patient_socket{-1};
+std::atomic<int> hurried_socket{-1};
+constexpr struct timeval kPatience = {1, 0};
+constexpr struct timeval kMoment = {0, 20'000};
 
-// Set while the log daemon has its socket open and does not read. One line has then waited for it;
-// the following ones do not wait again until one gets through.
+// Set when a line has waited its second in vain: the log daemon has its socket open and does not
+// read. Until a line gets through again, the others wait for a moment only.
 std::atomic<bool> stalled{false};
 
 struct __attribute__((packed)) Header {
@@ -35,40 +40,62 @@ struct __attribute__((packed)) Header {
 };
 static_assert(sizeof(Header) == 11, "the header is packed");
 
+bool is_past(const struct timespec& deadline) {
+  struct timespec now;
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  return now.tv_sec >= deadline.tv_sec;
+}
+
 bool send_line(const struct msghdr& message) {
-  int fd = log_socket.load(std::memory_order_relaxed);
-  if (fd < 0) return false;
+  // Signals may interrupt the wait again and again; it does not begin anew for ever.
   struct timespec deadline;
   clock_gettime(CLOCK_MONOTONIC, &deadline);
-  deadline.tv_sec += kFullQueueWait + 1;
-  for (;;) {
-    int flags = MSG_NOSIGNAL;
-    if (stalled.load(std::memory_order_relaxed)) flags |= MSG_DONTWAIT;
-    if (sendmsg(fd, &message, flags) >= 0) {
-      stalled.store(false, std::memory_order_relaxed);
+  deadline.tv_sec += 2;
+  do {
+    int fd = stalled ? hurried_socket : patient_socket;
+    if (sendmsg(fd, &message, MSG_NOSIGNAL) >= 0) {
+      stalled = false;
       return true;
     }
-    if (errno != EINTR) break;
-    struct timespec now;
-    clock_gettime(CLOCK_MONOTONIC, &now);
-    if (now.tv_sec >= deadline.tv_sec) break;
-  }
-  if (errno == EAGAIN || errno == EINTR) stalled.store(true, std::memory_order_relaxed);
+  } while (errno == EINTR && !is_past(deadline));
+  if (errno == EAGAIN || errno == EINTR) stalled = true;
   return false;
 }
 
+// Writes to standard error, but neither waits for who reads it nor dies because nobody does.
+void write_softly(const struct iovec* parts, int count) {
+  struct pollfd ready = {STDERR_FILENO, POLLOUT, 0};
+  if (poll(&ready, 1, 0) != 1 || (ready.revents & POLLOUT) == 0) return;
+  sigset_t broken_pipe, earlier, pending;
+  sigemptyset(&broken_pipe);
+  sigaddset(&broken_pipe, SIGPIPE);
+  pthread_sigmask(SIG_BLOCK, &broken_pipe, &earlier);
+  sigpending(&pending);
+  ssize_t written = writev(STDERR_FILENO, parts, count);
+  if (written == -1 && errno == EPIPE && sigismember(&pending, SIGPIPE) == 0) {
+    const struct timespec at_once = {0, 0};
+    sigtimedwait(&broken_pipe, nullptr, &at_once);
+  }
+  pthread_sigmask(SIG_SETMASK, &earlier, nullptr);
+}
+
+// In logcat's brief form: every line of the text has the head.
 void write_to_stderr(int priority, const char* text, size_t length) {
   static constexpr char kLetters[] = "??VDIWEFS";
   char head[64];
   char letter = priority >= 0 && priority < 9 ? kLetters[priority] : '?';
   int head_length = snprintf(head, sizeof head, "%c/%-8s(%5d): ", letter, kTag, getpid());
   char line_end[] = "\n";
-  size_t end_length = length > 0 && text[length - 1] == '\n' ? 0 : 1;
-  struct iovec parts[] = {{head, static_cast<size_t>(head_length)},
-                          {const_cast<char*>(text), length},
-                          {line_end, end_length}};
-  ssize_t ignored = writev(STDERR_FILENO, parts, 3);
-  (void)ignored;
+  const char* const end = text + length;
+  do {
+    const char* next = static_cast<const char*>(memchr(text, '\n', end - text));
+    size_t line_length = (next == nullptr ? end : next) - text;
+    struct iovec parts[] = {{head, static_cast<size_t>(head_length)},
+                            {const_cast<char*>(text), line_length},
+                            {line_end, 1}};
+    write_softly(parts, 3);
+    text = next == nullptr ? end : next + 1;
+  } while (text < end);
 }
 
 void log_line(const __android_logger_data* data, const char* text) {
@@ -96,12 +123,15 @@ void log_line(const __android_logger_data* data, const char* text) {
   errno = saved_errno;
 }
 
-__attribute__((constructor)) void set_up_logger() {
+int open_log_socket(const struct timeval& wait) {
   int fd = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
-  // A datagram queue holds few lines; the kernel waits this long for room in a full one.
-  struct timeval wait = {kFullQueueWait, 0};
   setsockopt(fd, SOL_SOCKET, SO_SNDTIMEO, &wait, sizeof wait);
-  log_socket = fd;
+  return fd;
+}
+
+__attribute__((constructor)) void set_up_logger() {
+  patient_socket = open_log_socket(kPatience);
+  hurried_socket = open_log_socket(kMoment);
   __android_log_set_logger(log_line);
   __android_log_set_minimum_priority(ANDROID_LOG_VERBOSE);
 }

@@ -1,0 +1,25 @@
+#include "early/area.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "core/state.h"
+#include "storage/mkdirs.h"
+
+namespace corvexd {
+namespace {
+
+constexpr mode_t kAreaMode = 0775;
+
+}  // namespace
+
+Path cache_file(const char* name) { return Path().append(cache_path).append(name); }
+
+void provide_area(const char* name) {
+  const Path area = cache_file(name);
+  if (access(area.c_str(), R_OK) == 0) return;
+  mkdirs(area.c_str());
+  chmod(area.c_str(), kAreaMode);
+}
+
+}  // namespace corvexd

@@ -1,0 +1,95 @@
+#include "early/initial_log.h"
+
+#include <cutils/properties.h>
+#include <unistd.h>
+
+#include "capture/children.h"
+#include "capture/logcat_vector.h"
+#include "core/log.h"
+#include "core/path_buffer.h"
+#include "core/pause.h"
+#include "core/thread.h"
+#include "early/area.h"
+
+namespace corvexd {
+namespace {
+
+constexpr char kArea[] = "log_before_initial/";
+constexpr char kMarker[] = "fileAfter911";
+constexpr int32_t kSizeLimit = 15'728'640;  // bytes
+constexpr time_t kCheckPeriod = 100;        // seconds
+
+struct InitialRecorder {
+  ChildSlot* slot;
+  const char* file;
+  LogcatJob job;
+  const char* line;
+};
+
+ChildSlot android_slot, kernel_slot, event_slot;
+
+constexpr InitialRecorder kInitialRecorders[] = {
+    {&android_slot,
+     "log_before_initial/android_initial.log",
+     {"2048", "4", {"system", "main", "crash"}, true},
+     "corvexd: executeOnBootLogcat android \n"},
+    {&kernel_slot,
+     "log_before_initial/kernel_initial.log",
+     {"1024", "4", {"kernel"}, false},
+     "corvexd: executeOnBootLogcat kernel \n"},
+    {&event_slot,
+     "log_before_initial/event_initial.log",
+     {"1024", "4", {"events"}, false},
+     "corvexd: executeOnBootLogcat event \n"},
+};
+
+// The oldest first; what the events recorder wrote is never deleted.
+constexpr const char* kDeletionOrder[] = {
+    "log_before_initial/android_initial.log.4", "log_before_initial/android_initial.log.3",
+    "log_before_initial/android_initial.log.2", "log_before_initial/android_initial.log.1",
+    "log_before_initial/android_initial.log",   "log_before_initial/kernel_initial.log.4",
+    "log_before_initial/kernel_initial.log.3",  "log_before_initial/kernel_initial.log.2",
+    "log_before_initial/kernel_initial.log.1",  "log_before_initial/kernel_initial.log",
+};
+
+void run_initial_recorder(const void* argument) {
+  const auto& recorder = *static_cast<const InitialRecorder*>(argument);
+  log_error("%s", recorder.line);
+  exec_logcat(recorder.job, cache_file(recorder.file).c_str());
+}
+
+}  // namespace
+
+void execute911Logcat() {
+  handle_ended_children();
+  if (access(cache_file(kMarker).c_str(), R_OK) == 0) return;
+  property_set("oem.after.clear", "false");
+  start_thread(delete_file);
+  provide_area(kArea);
+  for (const InitialRecorder& recorder : kInitialRecorders) {
+    start_child(*recorder.slot, run_initial_recorder, &recorder);
+  }
+}
+
+void* delete_file(void*) {
+  log_error("corvexd: delete_file start!\n");
+  const Path area = cache_file(kArea);
+  for (;;) {
+    while (getDirSize(area.c_str()) > kSizeLimit && deleteFile()) {
+    }
+    pause_seconds(kCheckPeriod);
+  }
+}
+
+bool deleteFile() {
+  for (const char* name : kDeletionOrder) {
+    const Path path = cache_file(name);
+    if (access(path.c_str(), R_OK) != 0) continue;
+    if (unlink(path.c_str()) == 0) return true;
+    log_error("corvexd: can't remove %s \n", path.c_str());
+    return false;
+  }
+  return false;
+}
+
+}  // namespace corvexd

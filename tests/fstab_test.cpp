@@ -1,0 +1,234 @@
+#include "fs_mgr/fs_mgr_fstab.h"
+
+#include <android-base/properties.h>
+#include <string.h>
+#include <sys/mount.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <memory>
+
+#include "fs_mgr/fs_mgr_boot_config.h"
+#include "tests/device_root.h"
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+using Table = std::unique_ptr<fstab, decltype(&fs_mgr_free_fstab)>;
+using Texts = std::vector<std::string>;
+
+class Fstab : public DeviceTest {
+ protected:
+  Table read(const std::string& content) {
+    write_file("/data/fstab", content);
+    return {fs_mgr_read_fstab("/data/fstab"), fs_mgr_free_fstab};
+  }
+
+  // The only entry of a table whose fifth field is this.
+  Table read_options(const std::string& options) { return read("/dev/a /a ext4 ro " + options); }
+};
+
+TEST_F(Fstab, EntriesAreRecords) {
+  Table table = read(
+      "# comment\n \t\r\n   # another\n"
+      "/dev/block/by-name/userdata /data ext4 "
+      "noatime,nosuid,nodev,barrier=1,,noauto_da_alloc wait,check,forceencrypt=footer\textra # x\n"
+      "/dev/b\t \t/data/b vfat ro,unbindable,roomy,private voldmanaged=sdcard1:auto,notrim\r\n"
+      "\xff\xfe /c swap defaults defaults");
+  ASSERT_NE(nullptr, table);
+  EXPECT_EQ(3, table->entry_count);
+  EXPECT_STREQ("/data/fstab", table->source_path);
+  const fstab_entry& data = table->entries[0];
+  EXPECT_STREQ("/dev/block/by-name/userdata", data.mount_source);
+  EXPECT_STREQ("ext4", data.fs_type);
+  EXPECT_EQ(0x406u, data.mount_flags);
+  EXPECT_STREQ("barrier=1,noauto_da_alloc", data.mount_options);
+  EXPECT_EQ(0x403, data.fs_mgr_flags);
+  EXPECT_STREQ("footer", data.key_location);
+  EXPECT_EQ(-1, data.partition_number);
+  EXPECT_EQ(-1, data.swap_priority);
+  const fstab_entry& card = table->entries[1];
+  EXPECT_EQ(0x60001u, card.mount_flags) << "a keyword is a prefix: roomy is ro";
+  EXPECT_EQ(nullptr, card.mount_options);
+  EXPECT_STREQ("sdcard1", card.label);
+  EXPECT_EQ(0x1010, card.fs_mgr_flags);
+  EXPECT_STREQ("\xff\xfe", table->entries[2].mount_source);
+
+  EXPECT_EQ(&table->entries[0], fs_mgr_get_entry_for_mount_point(table.get(), "/data"));
+  EXPECT_EQ(&table->entries[0], fs_mgr_get_entry_for_mount_point(table.get(), "/data/b"));
+  EXPECT_EQ(nullptr, fs_mgr_get_entry_for_mount_point(table.get(), "/datax"));
+  EXPECT_EQ(nullptr, fs_mgr_get_entry_for_mount_point(nullptr, "/data"));
+}
+
+TEST_F(Fstab, NumbersAreReadAsTheyAreWritten) {
+  const uint64_t memory = static_cast<uint64_t>(sysconf(_SC_PHYS_PAGES)) * 50 / 100 *
+                          static_cast<uint64_t>(sysconf(_SC_PAGESIZE));
+  struct {
+    const char* options;
+    std::function<bool(const fstab_entry&)> right;
+  } rows[] = {
+      {"length=-0x10", [](auto& e) { return e.length == -16; }},
+      {"length=99999999999999999999", [](auto& e) { return e.length == INT64_MAX; }},
+      {"voldmanaged=l:010", [](auto& e) { return e.partition_number == 8; }},
+      {"swapprio=-5", [](auto& e) { return e.swap_priority == -5; }},
+      {"swapprio=4294967297", [](auto& e) { return e.swap_priority == 1; }},
+      {"max_comp_streams=0x4", [](auto& e) { return e.max_comp_streams == 4; }},
+      {"zramsize=1048576", [](auto& e) { return e.zram_size == 1048576; }},
+      {"zramsize=50%", [&](auto& e) { return e.zram_size == static_cast<uint32_t>(memory); }},
+      {"reservedsize=128M", [](auto& e) { return e.reserved_size == 134217728; }},
+      {"reservedsize=3g", [](auto& e) { return e.reserved_size == 3ull << 30; }},
+      {"reservedsize=7kM", [](auto& e) { return e.reserved_size == 7168; }},
+      {"reservedsize=0x10", [](auto& e) { return e.reserved_size == 0; }},
+      {"eraseblk=0x1000", [](auto& e) { return e.erase_block_size == 4096; }},
+      {"eraseblk=1000", [](auto& e) { return e.erase_block_size == 0; }},
+      {"eraseblk=4097", [](auto& e) { return e.erase_block_size == 0; }},
+      {"logicalblk=8192", [](auto& e) { return e.logical_block_size == 8192; }},
+  };
+  for (const auto& row : rows) {
+    Table table = read_options(row.options);
+    ASSERT_NE(nullptr, table);
+    EXPECT_TRUE(row.right(table->entries[0])) << row.options;
+  }
+}
+
+TEST_F(Fstab, ParametersGoToTheirFields) {
+  struct {
+    const char* options;
+    int flags;
+    const char* key;
+    uint32_t contents, names;
+  } rows[] = {
+      {"encryptable=footer", 0x4, "footer", 0, 0},
+      {"forceencrypt=a,forceencrypt=b=c", 0x400, "b=c", 0, 0},
+      {"forcefdeorfbe=/m", 0x10000, "/m", 1, 3},
+      {"fileencryption=ice", 0x2000, nullptr, 2, 3},
+      {"fileencryption=aes-256-xts:aes-256-heh", 0x2000, nullptr, 1, 4},
+      {"fileencryption=foo", 0x2000, nullptr, 0, 3},
+      {"fileencryption=software:bar", 0x2000, nullptr, 1, 0},
+      {"verifyatboot,verify,encryptable", 0x80200, nullptr, 0, 0},
+  };
+  for (const auto& row : rows) {
+    Table table = read_options(row.options);
+    ASSERT_NE(nullptr, table);
+    const fstab_entry& entry = table->entries[0];
+    EXPECT_EQ(row.flags, entry.fs_mgr_flags) << row.options;
+    EXPECT_STREQ(row.key, entry.key_location) << row.options;
+    EXPECT_EQ(row.contents, entry.file_contents_mode) << row.options;
+    EXPECT_EQ(row.names, entry.file_names_mode) << row.options;
+    EXPECT_EQ(nullptr, entry.verity_location);
+  }
+  EXPECT_STREQ("/v", read_options("verify=/v")->entries[0].verity_location);
+  EXPECT_STREQ("/k", read_options("keydirectory=/k")->entries[0].key_directory);
+  EXPECT_EQ(0x10, read_options("voldmanaged=sdcard1")->entries[0].fs_mgr_flags);
+  EXPECT_EQ((Texts{"[libfs_mgr]Unknown file contents encryption mode: foo",
+                   "[libfs_mgr]Unknown file names encryption mode: bar",
+                   "[libfs_mgr]Warning: unknown flag encryptable",
+                   "[libfs_mgr]Warning: voldmanaged= flag malformed"}),
+            log.texts());
+}
+
+TEST_F(Fstab, OptionsAreKeptWhole) {
+  const std::string half(500, 'h'), third(600, 't');
+  Table table = read("/dev/a /a ext4 " + half + "," + third + ",x=1 wait");
+  EXPECT_EQ(half + ",x=1", table->entries[0].mount_options);
+  char field[] = "a,b";
+  char options[3];
+  const flag_list no_keywords[] = {{nullptr, 0}};
+  EXPECT_EQ(0, parse_flags(field, no_keywords, nullptr, options, sizeof options));
+  EXPECT_STREQ("a", options);
+}
+
+TEST_F(Fstab, WhatIsNoTableIsRefusedWithItsReason) {
+  struct {
+    const char* content;
+    const char* line;
+  } rows[] = {
+      {"# nothing\n\n", "[libfs_mgr]No entries found in fstab"},
+      {" x", "[libfs_mgr]Error parsing mount_point"},
+      {"a b c d wait\n\fa b", "[libfs_mgr]Error parsing fs_type"},
+      {"a b c", "[libfs_mgr]Error parsing mount_flags"},
+      {"a b c ro,x=1 \n", "[libfs_mgr]Error parsing fs_mgr_options"},
+      {"a b c d slotselect", "[libfs_mgr]Error updating for slotselect"},
+  };
+  for (const auto& row : rows) {
+    log.clear();
+    EXPECT_EQ(nullptr, read(row.content)) << row.content;
+    EXPECT_EQ((Texts{row.line,
+                     "[libfs_mgr]fs_mgr_read_fstab(): failed to load fstab from : "
+                     "'/data/fstab'"}),
+              log.texts());
+  }
+  EXPECT_EQ(nullptr, fs_mgr_read_fstab("/data/none"));
+  EXPECT_TRUE(log.has(
+      "[libfs_mgr]fs_mgr_read_fstab(): cannot open file: '/data/none': No such file or directory"));
+}
+
+class BootConfig : public DeviceTest {
+ protected:
+  BootConfig() {
+    write_file("/data/cmdline", "");
+    EXPECT_EQ(0, mount("/data/cmdline", "/proc/cmdline", nullptr, MS_BIND, nullptr));
+    run("mkdir -p /data/dt");
+  }
+  ~BootConfig() override { umount2("/proc/cmdline", MNT_DETACH); }
+
+  void set_device_tree(const std::string& compatible, const std::string& slot) {
+    write_file("/data/dt/compatible", compatible);
+    write_file("/data/dt/slot", slot);
+  }
+};
+
+// The suffix as a fresh process finds it: the device-tree directory is found out only once.
+std::string suffix_of(const std::string& command_line) {
+  write_file("/data/cmdline", command_line);
+  pid_t child = fork();
+  if (child == 0) {
+    write_file("/data/suffix", fs_mgr_get_slot_suffix());
+    _exit(0);
+  }
+  waitpid(child, nullptr, 0);
+  return read_file("/data/suffix");
+}
+
+TEST_F(BootConfig, TheFirstSourceThatKnowsWins) {
+  const std::string dt = " androidboot.android_dt_dir=/data/dt";
+  EXPECT_EQ("", suffix_of("quiet androidboot.slotx=c androidboot.slot androidboot.slot=a=b"));
+  EXPECT_EQ("_a", suffix_of("x  androidboot.slot_suffix=_a\n"));
+  EXPECT_EQ("_b",
+            suffix_of("androidboot.slot_suffix=_a   androidboot.slot=b androidboot.slot=c\n"));
+  set_device_tree(std::string("android,firmware\0", 17), std::string("d\0", 2));
+  EXPECT_EQ("_d", suffix_of("x" + dt));
+  EXPECT_EQ("_d", suffix_of("androidboot.slot=" + dt)) << "empty is no answer";
+  EXPECT_EQ("_b", suffix_of("androidboot.slot=b" + dt));
+  set_device_tree("android,firmware", std::string("d\0", 2));
+  EXPECT_EQ("", suffix_of("x" + dt));
+  set_device_tree(std::string("android,firmware\0", 17), "");
+  EXPECT_EQ("", suffix_of("x" + dt));
+  android::base::SetProperty("ro.boot.slot", "p");
+  EXPECT_EQ("_p", suffix_of("androidboot.slot=b"));
+}
+
+TEST_F(BootConfig, SlotsAreAppendedToTheSourcesThatAskForThem) {
+  write_file("/data/cmdline", "androidboot.slot=a\n");
+  write_file("/data/fstab", "/dev/s /s ext4 ro slotselect,verify\n/dev/d /d ext4 ro wait\n");
+  Table table(fs_mgr_read_fstab("/data/fstab"), fs_mgr_free_fstab);
+  ASSERT_NE(nullptr, table);
+  EXPECT_STREQ("/dev/s_a", table->entries[0].mount_source);
+  EXPECT_STREQ("/dev/d", table->entries[1].mount_source);
+}
+
+TEST_F(BootConfig, ANullResultEndsTheProcess) {
+  pid_t child = fork();
+  if (child == 0) {
+    fs_mgr_get_boot_config("slot", nullptr);
+    _exit(0);
+  }
+  int status;
+  waitpid(child, &status, 0);
+  EXPECT_TRUE(WIFSIGNALED(status));
+  EXPECT_TRUE(log.has("Check failed: out_val != nullptr in libfs_mgr "));
+}
+
+}  // namespace
+}  // namespace corvexd::test

@@ -1,0 +1,60 @@
+#include "tests/property_service.h"
+
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include "tests/device_root.h"
+#include "tests/files.h"
+
+namespace corvexd::test {
+namespace {
+
+std::string receive_text(int client) {
+  uint32_t length = 0;
+  recv(client, &length, sizeof length, MSG_WAITALL);
+  std::string text(length, '\0');
+  if (length > 0) recv(client, text.data(), length, MSG_WAITALL);
+  return text;
+}
+
+}  // namespace
+
+PropertyService::PropertyService() : socket_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
+  const struct sockaddr_un address = {AF_UNIX, "/dev/socket/property_service"};
+  EXPECT_EQ(0, bind(socket_, reinterpret_cast<const sockaddr*>(&address), sizeof address));
+  listen(socket_, 8);
+  server_ = std::thread([this] { serve(); });
+}
+
+PropertyService::~PropertyService() {
+  shutdown(socket_, SHUT_RDWR);
+  server_.join();
+  close(socket_);
+}
+
+void PropertyService::serve() {
+  for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
+    uint32_t command = 0, done = 0;
+    recv(client, &command, sizeof command, MSG_WAITALL);
+    std::string key = receive_text(client);
+    std::string value = receive_text(client);
+    if (key.rfind("ctl.", 0) != 0) set_property(key, value);
+    {
+      std::lock_guard<std::mutex> lock(mutex_);
+      requests_.emplace_back(key, value);
+    }
+    send(client, &done, sizeof done, MSG_NOSIGNAL);
+    close(client);
+  }
+}
+
+std::vector<std::pair<std::string, std::string>> PropertyService::requests() {
+  std::lock_guard<std::mutex> lock(mutex_);
+  return requests_;
+}
+
+std::string property(const std::string& key) { return read_file("/dev/__properties__/" + key); }
+
+}  // namespace corvexd::test
