@@ -6,7 +6,6 @@
 #include <atomic>
 #include <thread>
 
-#include "core/local_time.h"
 #include "core/path_buffer.h"
 #include "core/pause.h"
 #include "core/published_path.h"
@@ -102,25 +101,6 @@ TEST_F(Core, LogRootFollowsItsTwoProperties) {
     EXPECT_TRUE(log.has("corvexd LOG_ROOT : " + root + "\n"));
   }
   EXPECT_TRUE(log.has("corvexd watchdogProp : false, log_path : data  \n"));
-}
-
-TEST_F(Core, TimestampIsLocalTime) {
-  setenv("TZ", "XYZ-5:30", 1);
-  tzset();
-  time_t now;
-  std::string stamp;
-  do {
-    now = time(nullptr);
-    stamp = local_timestamp().c_str();
-  } while (time(nullptr) != now);
-  now += (5 * 60 + 30) * 60;
-  struct tm expected;
-  gmtime_r(&now, &expected);
-  char text[64];
-  strftime(text, sizeof text, "%Y-%m-%d-%H-%M-%S", &expected);
-  EXPECT_EQ(text, stamp);
-  unsetenv("TZ");
-  tzset();
 }
 
 }  // namespace

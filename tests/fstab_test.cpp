@@ -7,6 +7,8 @@
 #include <unistd.h>
 
 #include <memory>
+#include <sstream>
+#include <utility>
 
 #include "fs_mgr/fs_mgr_boot_config.h"
 #include "tests/device_root.h"
@@ -24,9 +26,6 @@ class Fstab : public DeviceTest {
     write_file("/data/fstab", content);
     return {fs_mgr_read_fstab("/data/fstab"), fs_mgr_free_fstab};
   }
-
-  // The only entry of a table whose fifth field is this.
-  Table read_options(const std::string& options) { return read("/dev/a /a ext4 ro " + options); }
 };
 
 TEST_F(Fstab, EntriesAreRecords) {
@@ -61,66 +60,63 @@ TEST_F(Fstab, EntriesAreRecords) {
   EXPECT_EQ(nullptr, fs_mgr_get_entry_for_mount_point(nullptr, "/data"));
 }
 
-TEST_F(Fstab, NumbersAreReadAsTheyAreWritten) {
-  const uint64_t memory = static_cast<uint64_t>(sysconf(_SC_PHYS_PAGES)) * 50 / 100 *
-                          static_cast<uint64_t>(sysconf(_SC_PAGESIZE));
-  struct {
-    const char* options;
-    std::function<bool(const fstab_entry&)> right;
-  } rows[] = {
-      {"length=-0x10", [](auto& e) { return e.length == -16; }},
-      {"length=99999999999999999999", [](auto& e) { return e.length == INT64_MAX; }},
-      {"voldmanaged=l:010", [](auto& e) { return e.partition_number == 8; }},
-      {"swapprio=-5", [](auto& e) { return e.swap_priority == -5; }},
-      {"swapprio=4294967297", [](auto& e) { return e.swap_priority == 1; }},
-      {"max_comp_streams=0x4", [](auto& e) { return e.max_comp_streams == 4; }},
-      {"zramsize=1048576", [](auto& e) { return e.zram_size == 1048576; }},
-      {"zramsize=50%", [&](auto& e) { return e.zram_size == static_cast<uint32_t>(memory); }},
-      {"reservedsize=128M", [](auto& e) { return e.reserved_size == 134217728; }},
-      {"reservedsize=3g", [](auto& e) { return e.reserved_size == 3ull << 30; }},
-      {"reservedsize=7kM", [](auto& e) { return e.reserved_size == 7168; }},
-      {"reservedsize=0x10", [](auto& e) { return e.reserved_size == 0; }},
-      {"eraseblk=0x1000", [](auto& e) { return e.erase_block_size == 4096; }},
-      {"eraseblk=1000", [](auto& e) { return e.erase_block_size == 0; }},
-      {"eraseblk=4097", [](auto& e) { return e.erase_block_size == 0; }},
-      {"logicalblk=8192", [](auto& e) { return e.logical_block_size == 8192; }},
-  };
-  for (const auto& row : rows) {
-    Table table = read_options(row.options);
-    ASSERT_NE(nullptr, table);
-    EXPECT_TRUE(row.right(table->entries[0])) << row.options;
+// What an entry's fifth field has set, each thing behind a blank.
+std::string parameters(const fstab_entry& e) {
+  std::ostringstream text;
+  text << std::hex << "0x" << e.fs_mgr_flags << std::dec;
+  for (const auto& [name, value] : {std::pair{"key", e.key_location},
+                                    {"directory", e.key_directory},
+                                    {"verity", e.verity_location},
+                                    {"label", e.label}}) {
+    if (value != nullptr) text << " " << name << ":" << value;
   }
+  for (const auto& [name, value] : {std::pair{"length", e.length},
+                                    {"partition", int64_t{e.partition_number} + 1},
+                                    {"swap", int64_t{e.swap_priority} + 1},
+                                    {"streams", int64_t{e.max_comp_streams}},
+                                    {"zram", int64_t{e.zram_size}},
+                                    {"reserved", static_cast<int64_t>(e.reserved_size)},
+                                    {"contents", int64_t{e.file_contents_mode}},
+                                    {"names", int64_t{e.file_names_mode}},
+                                    {"erase", int64_t{e.erase_block_size}},
+                                    {"logical", int64_t{e.logical_block_size}}}) {
+    if (value != 0) text << " " << name << ":" << value;
+  }
+  return text.str();
 }
 
-TEST_F(Fstab, ParametersGoToTheirFields) {
-  struct {
-    const char* options;
-    int flags;
-    const char* key;
-    uint32_t contents, names;
-  } rows[] = {
-      {"encryptable=footer", 0x4, "footer", 0, 0},
-      {"forceencrypt=a,forceencrypt=b=c", 0x400, "b=c", 0, 0},
-      {"forcefdeorfbe=/m", 0x10000, "/m", 1, 3},
-      {"fileencryption=ice", 0x2000, nullptr, 2, 3},
-      {"fileencryption=aes-256-xts:aes-256-heh", 0x2000, nullptr, 1, 4},
-      {"fileencryption=foo", 0x2000, nullptr, 0, 3},
-      {"fileencryption=software:bar", 0x2000, nullptr, 1, 0},
-      {"verifyatboot,verify,encryptable", 0x80200, nullptr, 0, 0},
+TEST_F(Fstab, OptionsSetTheirParameters) {
+  const uint64_t memory = static_cast<uint64_t>(sysconf(_SC_PHYS_PAGES)) * 50 / 100 *
+                          static_cast<uint64_t>(sysconf(_SC_PAGESIZE));
+  const std::pair<const char*, std::string> rows[] = {
+      {"encryptable=footer", "0x4 key:footer"},
+      {"forceencrypt=a,forceencrypt=b=c", "0x400 key:b=c"},
+      {"forcefdeorfbe=/m", "0x10000 key:/m contents:1 names:3"},
+      {"fileencryption=ice", "0x2000 contents:2 names:3"},
+      {"fileencryption=aes-256-xts:aes-256-heh", "0x2000 contents:1 names:4"},
+      {"fileencryption=foo", "0x2000 names:3"},
+      {"fileencryption=software:bar", "0x2000 contents:1"},
+      {"verifyatboot,verify,encryptable", "0x80200"},
+      {"verify=/v,keydirectory=/k", "0x4000200 directory:/k verity:/v"},
+      {"voldmanaged=sdcard1", "0x10"},
+      {"voldmanaged=l:010", "0x10 label:l partition:9"},
+      {"length=-0x10", "0x20 length:-16"},
+      {"length=99999999999999999999", "0x20 length:9223372036854775807"},
+      {"swapprio=-5,max_comp_streams=0x4", "0x100080 swap:-4 streams:4"},
+      {"swapprio=4294967297", "0x80 swap:2"},
+      {"zramsize=1048576", "0x100 zram:1048576"},
+      {"zramsize=50%", "0x100 zram:" + std::to_string(static_cast<uint32_t>(memory))},
+      {"reservedsize=128M", "0x200000 reserved:134217728"},
+      {"reservedsize=7kM", "0x200000 reserved:7168"},
+      {"reservedsize=0x10", "0x200000"},
+      {"eraseblk=0x1000,logicalblk=8192", "0x1800000 erase:4096 logical:8192"},
+      {"eraseblk=1000,logicalblk=4097", "0x1800000"},
   };
-  for (const auto& row : rows) {
-    Table table = read_options(row.options);
+  for (const auto& [options, expected] : rows) {
+    Table table = read("/dev/a /a ext4 ro " + std::string(options));
     ASSERT_NE(nullptr, table);
-    const fstab_entry& entry = table->entries[0];
-    EXPECT_EQ(row.flags, entry.fs_mgr_flags) << row.options;
-    EXPECT_STREQ(row.key, entry.key_location) << row.options;
-    EXPECT_EQ(row.contents, entry.file_contents_mode) << row.options;
-    EXPECT_EQ(row.names, entry.file_names_mode) << row.options;
-    EXPECT_EQ(nullptr, entry.verity_location);
+    EXPECT_EQ(expected, parameters(table->entries[0])) << options;
   }
-  EXPECT_STREQ("/v", read_options("verify=/v")->entries[0].verity_location);
-  EXPECT_STREQ("/k", read_options("keydirectory=/k")->entries[0].key_directory);
-  EXPECT_EQ(0x10, read_options("voldmanaged=sdcard1")->entries[0].fs_mgr_flags);
   EXPECT_EQ((Texts{"[libfs_mgr]Unknown file contents encryption mode: foo",
                    "[libfs_mgr]Unknown file names encryption mode: bar",
                    "[libfs_mgr]Warning: unknown flag encryptable",

@@ -90,7 +90,7 @@ def find_cycle(includes):
 def main():
     os.chdir(os.path.join(os.path.dirname(os.path.abspath(__file__)), ".."))
     includes = read_includes()
-    problems = ["%s: has no row in tests/check_includes.py" % name
+    problems = ["%s: has no row in .ci/check_includes.py" % name
                 for name in sorted({room(path) for path in includes} - set(ALLOWED) - set(OUTSIDE))]
     if not problems:
         for path, targets in includes.items():
