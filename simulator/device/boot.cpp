@@ -46,7 +46,8 @@ std::string build_folder() {
 }
 
 // The first process in the device's namespaces: makes its root and becomes its init.
-[[noreturn]] void become_init(const std::string& root, bool quiet, int mapped, int ready) {
+[[noreturn]] void become_init(const std::string& root, const BootOptions& options, int mapped,
+                              int ready) {
   char go;
   if (read(mapped, &go, 1) != 1) _exit(1);
   // The device does not outlive its keeper, whatever ends that.
@@ -54,12 +55,13 @@ std::string build_folder() {
   setsid();
   umask(022);
   std::string build = build_folder();
-  if (!mount_root(root) || !make_root_files() || !copy_programs(build) || !mount_rest_and_enter()) {
+  if (!mount_root(root) || !make_root_files(options.encrypted) || !copy_programs(build) ||
+      !mount_rest_and_enter()) {
     _exit(1);
   }
   int nothing = open("/dev/null", O_RDWR | O_CLOEXEC);
   dup2(nothing, STDIN_FILENO);
-  if (quiet) dup2(nothing, STDERR_FILENO);
+  if (options.quiet) dup2(nothing, STDERR_FILENO);
   dup2(STDERR_FILENO, STDOUT_FILENO);
   if (ready == kReadyFd) fcntl(ready, F_SETFD, 0);
   if (ready != kReadyFd) dup2(ready, kReadyFd);
@@ -113,7 +115,7 @@ void end_device(pid_t init, int init_end) {
 
 // Starts the device's init in its namespaces, as `*init`. Answers the pipe that brings a byte when
 // the device is ready, holding none on failure.
-unique_fd start_init(const std::string& root, bool quiet, pid_t* init) {
+unique_fd start_init(const std::string& root, const BootOptions& options, pid_t* init) {
   unique_fd mapped_read, mapped, ready, ready_write;
   if (!android::base::Pipe(&mapped_read, &mapped) || !android::base::Pipe(&ready, &ready_write)) {
     return unique_fd();
@@ -123,7 +125,7 @@ unique_fd start_init(const std::string& root, bool quiet, pid_t* init) {
   *init = static_cast<pid_t>(syscall(SYS_clone, namespaces | SIGCHLD, 0, 0, 0, 0));
   if (*init == 0) {
     mapped.reset();
-    become_init(root, quiet, mapped_read, ready_write);
+    become_init(root, options, mapped_read, ready_write);
   }
   if (*init < 0) {
     fprintf(stderr, "corvex-device: this machine allows no namespaces here: %m\n");
@@ -137,12 +139,12 @@ unique_fd start_init(const std::string& root, bool quiet, pid_t* init) {
 
 }  // namespace
 
-int boot_device(const std::string& root, bool quiet) {
+int boot_device(const std::string& root, const BootOptions& options) {
   unique_fd lock = lock_device(root);
   if (lock == -1) return 1;
   unique_fd signals = take_stop_signals();
   pid_t init = -1;
-  unique_fd ready = start_init(root, quiet, &init);
+  unique_fd ready = start_init(root, options, &init);
   if (init < 0) return 1;
   unique_fd init_end(static_cast<int>(syscall(SYS_pidfd_open, init, 0)));
   char byte;

@@ -76,13 +76,6 @@ constexpr struct {
      "media_rw:x:1023:\nshell:x:2000:\ncache:x:2001:\n"},
     {"etc/nsswitch.conf", "passwd: files\ngroup: files\nhosts: files\n"},
     {"etc/hosts", "127.0.0.1 localhost\n::1 localhost\n"},
-    {"vendor/etc/fstab.qcom",
-     "#<src> <mnt_point> <type> <mnt_flags> <fs_mgr_flags>\n"
-     "/dev/block/bootdevice/by-name/system /system ext4 ro,barrier=1 wait,verify\n"
-     "/dev/block/bootdevice/by-name/userdata /data ext4 "
-     "nosuid,nodev,barrier=1,noauto_da_alloc wait,check,encryptable=footer\n"
-     "/dev/block/bootdevice/by-name/cache /cache ext4 nosuid,nodev,barrier=1 wait,check\n"},
-    {"data/.layout_version", "3"},
     {"cache/recovery/last_log", "Starting recovery on a simulated device\n"},
 };
 
@@ -99,6 +92,7 @@ constexpr struct {
     {"simulator/programs/dumpsys", "system/bin/dumpsys"},
     {"simulator/programs/firmware", "system/bin/firmware"},
     {"simulator/programs/make_nodes", "system/bin/make_nodes"},
+    {"simulator/programs/start_storage", "system/bin/start_storage"},
     {"simulator/programs/pktlogconf", "vendor/bin/pktlogconf"},
     {"simulator/programs/iwpriv", "vendor/bin/iwpriv"},
     // The machine may allow its own tcpdump, by its path, to write only where a device does not.
@@ -126,6 +120,23 @@ bool copy_file(const std::string& from, const std::string& to, mode_t mode) {
   return true;
 }
 
+bool write_fstab(bool encrypted) {
+  constexpr char kFstab[] = "vendor/etc/fstab.qcom";
+  std::string text = "#<src> <mnt_point> <type> <mnt_flags> <fs_mgr_flags>\n";
+  text += "/dev/block/bootdevice/by-name/system /system ext4 ro,barrier=1 wait,verify\n";
+  text += "/dev/block/bootdevice/by-name/userdata /data ext4 nosuid,nodev,noauto_da_alloc ";
+  text += encrypted ? "wait,check,forceencrypt=footer\n" : "wait,check,encryptable=footer\n";
+  text += "/dev/block/bootdevice/by-name/cache /cache ext4 nosuid,nodev,barrier=1 wait,check\n";
+  return android::base::WriteStringToFile(text, kFstab) || report_failure(kFstab);
+}
+
+// On a phone the data partition is not mounted yet as the first programs start. Here it always is,
+// but the file by which they tell is not there before its time.
+bool hide_layout_version() {
+  constexpr char kLayoutVersion[] = "data/.layout_version";
+  return unlink(kLayoutVersion) == 0 || errno == ENOENT || report_failure(kLayoutVersion);
+}
+
 }  // namespace
 
 bool report_failure(const std::string& path) {
@@ -133,7 +144,7 @@ bool report_failure(const std::string& path) {
   return false;
 }
 
-bool make_root_files() {
+bool make_root_files(bool encrypted) {
   for (const auto& directory : kDirectories) {
     if (mkdir(directory.path, directory.mode) != 0) {
       if (errno != EEXIST) return report_failure(directory.path);
@@ -149,6 +160,7 @@ bool make_root_files() {
     if (access(file.path, F_OK) == 0) continue;
     if (!android::base::WriteStringToFile(file.text, file.path)) return report_failure(file.path);
   }
+  if (!write_fstab(encrypted) || !hide_layout_version()) return false;
   for (const auto& link : kLinks) {
     if (symlink(link.target, link.path) != 0 && errno != EEXIST) return report_failure(link.path);
   }

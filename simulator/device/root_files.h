@@ -6,10 +6,12 @@
 namespace corvexd::sim {
 
 // Both work in the current directory, the device's root, and leave what the device keeps in /data,
-// /cache and /storage. On failure each says what failed and answers false.
+// /cache and /storage, but for what no boot takes over from the last. On failure each says what
+// failed and answers false.
 
-// Makes the directories and small files that a device has from the start.
-bool make_root_files();
+// Makes the directories and small files that a device has from the start: an encrypted one has a
+// file-system table that forces encryption.
+bool make_root_files(bool encrypted);
 
 // Copies the device's programs from the build folder.
 bool copy_programs(const std::string& build);

@@ -27,9 +27,6 @@ constexpr struct {
     {"ro.build.type", "userdebug"},
     {"ro.build.ota.versionname", "SIM-8.1.0-0001"},
     {"ro.hardware", "qcom"},
-    {"ro.crypto.state", "unencrypted"},
-    {"sys.boot_completed", "1"},
-    {"vold.internalSD.mount", "1"},
 };
 
 bool is_key(const std::string& key) {

@@ -37,10 +37,12 @@ int64_t milliseconds_now() {
 
 }  // namespace
 
+enum class Runs { kFromBoot, kOnceAtBoot, kWhenAsked };  // the first is started again when it ends
+
 struct ServiceDefinition {
   const char* name;
   const char* const arguments[6];
-  bool from_boot;  // and started again when it ends; the others run once when asked for
+  Runs runs;
   ServiceSocket sockets[kMaxSockets];
 };
 
@@ -49,22 +51,23 @@ namespace {
 constexpr ServiceDefinition kServices[] = {
     {"logd",
      {"/system/bin/logd"},
-     true,
+     Runs::kFromBoot,
      {{"logdw", SOCK_DGRAM | SOCK_NONBLOCK, 0222, true}, {"logdr", SOCK_SEQPACKET, 0666, false}}},
-    {"firmware", {"/system/bin/firmware"}, true, {}},
+    {"firmware", {"/system/bin/firmware"}, Runs::kFromBoot, {}},
     // With a /proc of its own, in which the firmware's nodes are.
     {"corvexd",
      {"/usr/bin/unshare", "--mount", "/system/bin/sh", "-c",
       "mount --bind /dev/nodes/proc /proc && exec /system/bin/corvexd"},
-     true,
+     Runs::kFromBoot,
      {{"corvexd", SOCK_STREAM, 0660, false}}},
+    {"start_storage", {"/system/bin/start_storage"}, Runs::kOnceAtBoot, {}},
     {"logd-reinit",
      {"/system/bin/log", "-t", "logd-reinit", "log buffers kept as they are"},
-     false,
+     Runs::kWhenAsked,
      {}},
     {"diag_mdlog_start",
      {"/system/bin/log", "-t", "diag_mdlog", "diagnostic logging asked for"},
-     false,
+     Runs::kWhenAsked,
      {}},
 };
 
@@ -115,7 +118,7 @@ Services::Service* Services::find(const std::string& name) {
 bool Services::start(const std::string& name) {
   Service* service = find(name);
   if (service == nullptr) return false;
-  if (service->pid == 0 || service->definition->from_boot) service->wanted = true;
+  if (service->pid == 0 || service->definition->runs == Runs::kFromBoot) service->wanted = true;
   start_due();
   return true;
 }
@@ -136,7 +139,7 @@ bool Services::restart(const std::string& name) {
 }
 
 void Services::start_at_boot() {
-  for (Service& service : services_) service.wanted = service.definition->from_boot;
+  for (Service& service : services_) service.wanted = service.definition->runs != Runs::kWhenAsked;
   start_due();
 }
 
@@ -157,7 +160,7 @@ void Services::launch(Service* service) {
   // On both sides: a group that is to be killed is there from the first moment.
   setpgid(pid, pid);
   service->pid = pid;
-  service->wanted = definition.from_boot;
+  service->wanted = definition.runs == Runs::kFromBoot;
 }
 
 // The rest of a group goes while its ended leader keeps the number from being used again.
@@ -170,7 +173,7 @@ void Services::reap() {
       if (service.pid != ended.si_pid) continue;
       kill(-service.pid, SIGKILL);
       service.pid = 0;
-      if (!service.definition->from_boot) continue;
+      if (service.definition->runs != Runs::kFromBoot) continue;
       fprintf(stderr, "init: %s ended with %s %d\n", service.definition->name,
               ended.si_code == CLD_EXITED ? "status" : "signal", ended.si_status);
     }

@@ -49,6 +49,41 @@ check_thermal() {
         complain "the thermal record is not as it should be"
 }
 
+list() {
+    find "$1" -mindepth 1 -type d -printf '%10y  %P/\n' -o -printf '%10s  %P\n' | LC_ALL=C sort -k 2
+}
+
+# show_area DIRECTORY FILE...: the files must be in it.
+show_area() {
+    local area=$1 file
+    shift
+    echo
+    echo "$area:"
+    list "$area"
+    for file in "$@"; do [ -e "$area/$file" ] || complain "$area/$file"; done
+}
+
+# What a boot log held at the last show must have been set aside at this boot's start.
+show_boot_log() {
+    local area=/cache/boot_log shown=/cache/.boot_log_shown
+    local files=(android_boot.log event_boot.log kernel_boot.log radio_boot.log)
+    [ ! -e "$shown" ] || files+=("${files[@]/%/.pre}")
+    show_area "$area" "${files[@]}"
+    grep -q "corvexd main start" "$area/android_boot.log" ||
+        complain "$area/android_boot.log does not hold the daemon's first line"
+    touch "$shown"
+}
+
+show_initial_logs() {
+    local marker=/cache/fileAfter911
+    if [ -e "$marker" ]; then
+        echo "no initial phase is recorded: there is $marker"
+    else
+        show_area /cache/log_before_initial android_initial.log event_initial.log kernel_initial.log
+        echo "recorded at every boot until there is $marker: create it to end the initial phase"
+    fi
+}
+
 # show_tail FILE [WIDTH]
 show_tail() {
     echo
@@ -80,7 +115,7 @@ echo "log directories:"
 (cd "$logs" && ls -d KVBR_*)
 echo
 echo "$(basename "$PWD"):"
-find . -mindepth 1 -type d -printf '%10y  %P/\n' -o -printf '%10s  %P\n' | LC_ALL=C sort -k 2
+list .
 
 for file in *; do
     case $file in
@@ -90,6 +125,8 @@ for file in *; do
 done
 show_tail kv_tsen_data/* 1000
 show_packets
+show_boot_log
+show_initial_logs
 
 echo
 for buffer in main system crash; do
