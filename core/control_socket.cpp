@@ -62,6 +62,11 @@ int readx(int fd, void* buffer, int count) {
   return 0;
 }
 
+void keep_control_socket() {
+  int fd = android_get_control_socket(kSocketName);
+  if (fd >= 0) fcntl(fd, F_SETFD, FD_CLOEXEC);
+}
+
 void open_control_socket() {
   int fd = android_get_control_socket(kSocketName);
   if (fd < 0) {

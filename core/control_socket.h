@@ -7,6 +7,10 @@ namespace corvexd {
 // the stream ends or fails first; -1 at once for a negative count.
 int readx(int fd, void* buffer, int count);
 
+// Marks the socket that init handed over, if it did, so that no child inherits it. Before the first
+// child is started.
+void keep_control_socket();
+
 // Puts the socket that init handed over into listening state. Ends the process with status 1 when
 // there is none or it cannot listen.
 void open_control_socket();

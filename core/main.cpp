@@ -1,3 +1,6 @@
+#include "collect/file_observer.h"
+#include "collect/log_watchdog.h"
+#include "connectivity/debug_tags.h"
 #include "core/control_socket.h"
 #include "core/log.h"
 #include "core/settings.h"
@@ -15,8 +18,10 @@ int main() {
   choose_cache_directory();
   const bool force_encrypted = data_is_force_encrypted();
   log_info("corvexd firing up\n");
+  keep_control_socket();
   executeOnBootLogcat();
   start_thread(stopLogAfterBoot);
+  start_thread(connectivity_log_check);
   wait_for_layout();
   wait_for_data_partition(force_encrypted);
   loadSettings();
@@ -25,5 +30,7 @@ int main() {
   open_control_socket();
   start_persistent_capture();
   start_diagnostic_service();
+  start_thread(file_observer);
+  start_thread(log_file_observer);
   serve_clients();
 }

@@ -39,8 +39,10 @@ bool framework_has_restarted() {
 
 bool internal_storage_is_mounted() {
   log_error("corvexd: Waiting for internal sd be mounted... \n");
-  return reads("vold.internalSD.mount", "1") ||
-         (reads("ro.mount.tempfs", "true") && reads("vold.internalSD.mount", "A"));
+  char mount[PROPERTY_VALUE_MAX];
+  property_get("vold.internalSD.mount", mount, "");
+  bool on_tempfs = reads("ro.mount.tempfs", "true");
+  return strcmp(mount, "1") == 0 || (on_tempfs && strcmp(mount, "A") == 0);
 }
 
 }  // namespace

@@ -180,6 +180,7 @@ const flag_list* find_keyword(const flag_list* table, const char* option) {
 
 // Appends `option` and a comma, whole or not at all.
 void append_option(char* options, int options_size, const char* option) {
+  if (options_size <= 0) return;
   size_t used = strlen(options);
   size_t length = strlen(option);
   if (used + length + 1 >= static_cast<size_t>(options_size)) return;

@@ -103,8 +103,9 @@ DeviceTest::DeviceTest() {
 }
 
 void set_property(const std::string& key, const std::string& value) {
-  write_file("/dev/draft", value);
-  rename("/dev/draft", ("/dev/__properties__/" + key).c_str());
+  const std::string draft = "/dev/draft." + key;
+  write_file(draft, value);
+  rename(draft.c_str(), ("/dev/__properties__/" + key).c_str());
 }
 
 }  // namespace corvexd::test

@@ -1,6 +1,7 @@
 #include "tests/log_catcher.h"
 
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <string.h>
 #include <sys/socket.h>
 #include <sys/un.h>
@@ -23,7 +24,12 @@ void LogCatcher::start() {
   struct sockaddr_un address = {AF_UNIX, ""};
   strcpy(address.sun_path, kSocketPath);
   ASSERT_EQ(0, bind(socket_, reinterpret_cast<sockaddr*>(&address), sizeof address));
+  // A handler that interrupted the collector would wait for the collector to read what it logs.
+  sigset_t all, earlier;
+  sigfillset(&all);
+  pthread_sigmask(SIG_BLOCK, &all, &earlier);
   collector_ = std::thread([this] { collect(); });
+  pthread_sigmask(SIG_SETMASK, &earlier, nullptr);
 }
 
 void LogCatcher::stop() {
@@ -37,7 +43,7 @@ void LogCatcher::stop() {
 
 void LogCatcher::collect() {
   char record[8192];
-  for (ssize_t size; (size = recv(socket_, record, sizeof record, 0)) > 0;) {
+  for (ssize_t size; (size = TEMP_FAILURE_RETRY(recv(socket_, record, sizeof record, 0))) > 0;) {
     if (size == 1) {
       caught_up_ = true;
       continue;
