@@ -81,6 +81,11 @@ int end_start(ChildSlot& slot, pid_t result) {
   return deferred;
 }
 
+void mark_ended(ChildSlot& slot, int status) {
+  slot.running = false;
+  slot.status = status;
+}
+
 // Reaps one child, if one has ended and its slot can be told; false when it is put off.
 bool reap_one(pid_t* reaped) {
   SlotLock lock;
@@ -92,7 +97,7 @@ bool reap_one(pid_t* reaped) {
   *reaped = waitpid(-1, &status, WNOHANG);
   if (*reaped <= 0) return true;
   for (ChildSlot* slot = known_slots; slot != nullptr; slot = slot->next) {
-    if (slot->pid == *reaped) slot->running = false;
+    if (slot->pid == *reaped) mark_ended(*slot, status);
   }
   return true;
 }
@@ -109,6 +114,7 @@ void start_child(ChildSlot& slot, void (*body)(const void*), const void* argumen
   begin_start(slot);
   local_time_mutex.lock();
   pid_t result = fork();
+  int error = errno;
   local_time_mutex.unlock();
   if (result == 0) {
     free_lock_in_child();
@@ -116,11 +122,23 @@ void start_child(ChildSlot& slot, void (*body)(const void*), const void* argumen
     _exit(1);
   }
   for (int deferred = end_start(slot, result); deferred > 0; --deferred) deliver();
+  errno = error;
 }
 
 void exec_program(const char* path, const char* const* arguments) {
   execv(path, const_cast<char* const*>(arguments));
   _exit(1);
+}
+
+int wait_for_child(ChildSlot& slot) {
+  // Waited for without reaping, then reaped under the lock. When the handler was faster, it has
+  // left the status in the slot.
+  siginfo_t info;
+  TEMP_FAILURE_RETRY(waitid(P_PID, slot.pid, &info, WEXITED | WNOWAIT));
+  SlotLock lock;
+  int status;
+  if (slot.running && waitpid(slot.pid, &status, WNOHANG) == slot.pid) mark_ended(slot, status);
+  return slot.status;
 }
 
 void terminate_child(ChildSlot& slot) {

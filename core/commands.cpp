@@ -7,6 +7,9 @@
 
 #include "capture/capture.h"
 #include "capture/children.h"
+#include "collect/dumps.h"
+#include "connectivity/debug_tags.h"
+#include "connectivity/wifi_sniffer.h"
 #include "core/log.h"
 #include "core/state.h"
 #include "storage/capture_paths.h"
@@ -24,12 +27,6 @@ void begin_capture(int) {
   makeLogAbsolutePath();
   executeLogcat();
 }
-
-void end_capture(int) { stopLogcat(); }
-
-void start_sampler(int) { getCpuxThermal(); }
-
-void stop_sampler(int) { terminate_child(cpu_thermal_pid); }
 
 void answer(int connection, const char* reply) {
   size_t left = strlen(reply);
@@ -54,7 +51,15 @@ void delete_logs(int connection) {
   answer(connection, reply);
 }
 
-void change_path(int) { checkLogPath(); }
+void start_sniffer(int) {
+  log_info("wifi_snifflog_start");
+  wifi_snifflog_start();
+}
+
+void stop_sniffer(int) {
+  log_info("wifi_snifflog_stop");
+  wifi_snifflog_stop();
+}
 
 struct Command {
   const char* word;
@@ -63,29 +68,28 @@ struct Command {
 
 constexpr Command kCommands[] = {
     {"LOGBEGIN", begin_capture},
-    {"LOGSTOP", end_capture},
-    {"CACHECLEAR", nullptr},
-    {"BUGREPORT", nullptr},
-    {"CPUTHERMAL", start_sampler},
-    {"STOPCPUTHERMAL", stop_sampler},
+    {"LOGSTOP", [](int) { stopLogcat(); }},
+    {"CACHECLEAR", [](int) { cacheClear(); }},
+    {"BUGREPORT", [](int) { getBugreport(); }},
+    {"CPUTHERMAL", [](int) { getCpuxThermal(); }},
+    {"STOPCPUTHERMAL", [](int) { terminate_child(cpu_thermal_pid); }},
     {"DELETELOG", delete_logs},
-    {"OEM_BT_DEBUG_ENABLE", nullptr},
-    {"OEM_BT_DEBUG_DISABLE", nullptr},
-    {"OEM_GPS_DEBUG_ENABLE", nullptr},
-    {"OEM_GPS_DEBUG_DISABLE", nullptr},
-    {"OEM_NFC_DEBUG_ENABLE", nullptr},
-    {"OEM_NFC_DEBUG_DISABLE", nullptr},
-    {"WIFI_SNIFFLOG_START", nullptr},
-    {"WIFI_SNIFFLOG_STOP", nullptr},
-    {"CHANGEPATH", change_path},
+    {"OEM_BT_DEBUG_ENABLE", [](int) { set_bluetooth_android_log(1); }},
+    {"OEM_BT_DEBUG_DISABLE", [](int) { set_bluetooth_android_log(0); }},
+    {"OEM_GPS_DEBUG_ENABLE", [](int) { set_gps_android_log(1); }},
+    {"OEM_GPS_DEBUG_DISABLE", [](int) { set_gps_android_log(0); }},
+    {"OEM_NFC_DEBUG_ENABLE", [](int) { set_nfc_android_log(1); }},
+    {"OEM_NFC_DEBUG_DISABLE", [](int) { set_nfc_android_log(0); }},
+    {"WIFI_SNIFFLOG_START", start_sniffer},
+    {"WIFI_SNIFFLOG_STOP", stop_sniffer},
+    {"CHANGEPATH", [](int) { checkLogPath(); }},
 };
 
 }  // namespace
 
 void run_command(const char* text, int connection) {
   for (const Command& command : kCommands) {
-    // A word without an action is known and does nothing yet.
-    if (strcmp(text, command.word) == 0 && command.action != nullptr) command.action(connection);
+    if (strcmp(text, command.word) == 0) command.action(connection);
   }
 }
 

@@ -21,7 +21,7 @@ bool find_current_directory(WhichMark which, Path* path) {
     found = true;
     if (which == WhichMark::kFirst) break;
   }
-  if (!found) errno = ENOENT;
+  if (!found) errno = 0;
   return found;
 }
 

@@ -9,8 +9,8 @@ namespace corvexd {
 enum class WhichMark { kFirst, kLast };  // in the order of the listing
 
 // Sets *path to the directory under LOG_ROOT whose name holds "_current". Any thread. False, with
-// *path untouched, when there is none, the root cannot be opened (errno says why) or the path does
-// not fit.
+// *path untouched, when the root cannot be opened (errno says why) or holds none whose path fits
+// (errno is 0).
 bool find_current_directory(WhichMark which, Path* path);
 
 }  // namespace corvexd

@@ -1,0 +1,65 @@
+#include "collect/dumps.h"
+
+#include <errno.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include "capture/children.h"
+#include "core/local_time.h"
+#include "core/log.h"
+#include "core/path_buffer.h"
+#include "storage/current_directory.h"
+
+namespace corvexd {
+namespace {
+
+ChildSlot bugreport_slot;
+ChildSlot clear_slot;
+
+void run_bugreport(const void*) {
+  char file_name[100];
+  const char* line = otherLogsCommand("bugreport", "BUGREPORT", file_name);
+  if (line != nullptr) _exit(system(line) == 0 ? 0 : 1);
+}
+
+void run_clear(const void*) {
+  const char* arguments[] = {"logcat", "-c", nullptr};
+  exec_program("/system/bin/logcat", arguments);
+}
+
+void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* fork_error_format) {
+  start_child(slot, body, nullptr);
+  if (slot.pid < 0) {
+    log_error(fork_error_format, strerror(errno));
+    return;
+  }
+  if (WIFSIGNALED(wait_for_child(slot))) log_error("corvexd: Child terminated abnormally\n");
+}
+
+}  // namespace
+
+void getBugreport() {
+  run_and_wait(bugreport_slot, run_bugreport, "corvexd: Bugreport process fork error: %s");
+}
+
+void cacheClear() { run_and_wait(clear_slot, run_clear, "corvexd: Clear process fork error: %s"); }
+
+const char* otherLogsCommand(const char* command, const char* kind, char* file_name) {
+  static PathBuffer<200> line;
+  Path directory;
+  if (!find_current_directory(WhichMark::kFirst, &directory)) {
+    log_error("corvexd: no current log directory for %s\n", command);
+    return nullptr;
+  }
+  Timestamp file = local_timestamp();
+  file.append("-").append(kind).append(".log");
+  line.clear().append("/system/bin/").append(command).append(" > ");
+  line.append(directory.c_str()).append("/").append(file.c_str());
+  if (!file.fits() || !line.fits_or_log()) return nullptr;
+  strcpy(file_name, file.c_str());
+  return line.c_str();
+}
+
+}  // namespace corvexd

@@ -1,0 +1,193 @@
+#include "collect/file_observer.h"
+
+#include <android-base/unique_fd.h>
+#include <cutils/properties.h>
+#include <errno.h>
+#include <limits.h>
+#include <stdint.h>
+#include <stdio.h>
+#include <string.h>
+#include <sys/inotify.h>
+#include <unistd.h>
+
+#include "collect/artefact_mover.h"
+#include "core/local_time.h"
+#include "core/log.h"
+#include "core/pause.h"
+#include "core/state.h"
+#include "storage/copy.h"
+#include "storage/mkdirs.h"
+
+using android::base::unique_fd;
+
+namespace corvexd {
+namespace {
+
+constexpr size_t kBufferSize = 32768;
+constexpr char kScreenshots[] = "/data/media/0/Pictures/Screenshots";
+constexpr uint32_t kScreenshotEvents = IN_MODIFY | IN_CLOSE_WRITE | IN_CREATE;
+constexpr char kTraces[] = "/data/anr/";
+
+using LongPath = PathBuffer<256>;
+
+struct Watch {
+  const char* directory;
+  uint32_t events;
+};
+
+constexpr Watch kWatches[] = {
+    {"/data", IN_CREATE},
+    {"/data/tombstones", IN_CLOSE_WRITE},
+    {"/data/anr", IN_MODIFY | IN_CLOSE_WRITE | IN_MOVED_TO | IN_CREATE},
+    {"/data/system/dropbox", IN_MOVED_TO},
+    {"/data/misc/display", IN_MODIFY | IN_CREATE},
+    {kScreenshots, kScreenshotEvents},
+    {"/data/media/0/Pictures/", IN_CREATE},
+    {"/data/coredump/", IN_MODIFY | IN_CLOSE_WRITE | IN_CREATE},
+    {"/data/vendor/media/", IN_MODIFY | IN_CLOSE_WRITE | IN_MOVED_TO | IN_CREATE},
+};
+
+// Where a file that was closed after writing is to be found, by its name; the first match counts.
+struct ClosedArtefact {
+  const char* in_name;
+  const char* directory;
+};
+
+constexpr ClosedArtefact kClosedArtefacts[] = {
+    {"tombstone", "/data/tombstones"}, {"Screenshot", kScreenshots},
+    {"core", "/data/coredump/"},       {"html.gz", kTraces},
+    {"yuv", "/data/vendor/media/"},    {"264", "/data/vendor/media/"},
+};
+
+// What the kernel knew of binder calls at the moment of a trace.
+struct BinderState {
+  const char* source;
+  const char* name;
+};
+
+constexpr BinderState kBinderStates[] = {
+    {"/proc/proc_transactions", "transactions"},
+    {"/proc/proc_transaction_log", "transaction_log"},
+    {"/proc/proc_state", "state"},
+};
+
+bool holds(const char* name, const char* part) { return strstr(name, part) != nullptr; }
+
+bool is_trace(const char* name) { return holds(name, "trace") || holds(name, "anr_"); }
+
+void complete_trace(const ObserverState& state, const char* name) {
+  log_error("corvexd: traces: %s", name);
+  if (*state.anr_directory.c_str() == '\0') return;
+  LongPath source, target(state.anr_directory);
+  source.append(kTraces).append("/").append(name);
+  target.append("/").append(name);
+  if (!source.fits_or_log() || !target.fits_or_log()) return;
+  if (access(target.c_str(), R_OK) == 0 && unlink(target.c_str()) != 0) {
+    log_error("corvexd: can't remove %s'", target.c_str());
+  }
+  copy_file(source.c_str(), target.c_str());
+}
+
+void dump_input(const LongPath& directory) {
+  LongPath line;
+  line.append("/system/bin/dumpsys input | xargs -0 echo > ");
+  if (!line.append(directory.c_str()).append("dumpsys_input&").fits_or_log()) return;
+  if (FILE* pipe = popen(line.c_str(), "re")) {
+    pause_seconds(1);
+    pclose(pipe);
+  }
+  log_info("corvexd: anr_input is %s \n", line.c_str());
+}
+
+void begin_trace(ObserverState& state, const char* name) {
+  log_error("corvexd: traces: %s", name);
+  LongPath directory;
+  directory.append(LOG_DIR.get().c_str()).append("/anr/");
+  if (!directory.append(local_timestamp().c_str()).append("/").fits_or_log()) return;
+  state.anr_directory = directory;
+  mkdirs(directory.c_str());
+  for (const BinderState& binder : kBinderStates) {
+    LongPath target(directory);
+    if (target.append(binder.name).fits_or_log()) copy_file(binder.source, target.c_str());
+  }
+  dump_input(directory);
+}
+
+void handle_closed(const ObserverState& state, const char* name) {
+  for (const ClosedArtefact& artefact : kClosedArtefacts) {
+    if (!holds(name, artefact.in_name)) continue;
+    movefile(artefact.directory, name);
+    return;
+  }
+  if (is_trace(name)) complete_trace(state, name);
+}
+
+void handle_created(ObserverState& state, const char* name) {
+  if (is_trace(name)) {
+    begin_trace(state, name);
+  } else if (holds(name, "Screenshots")) {
+    inotify_add_watch(state.inotify_fd, kScreenshots, kScreenshotEvents);
+  } else if (holds(name, "core")) {
+    movefile("/data/coredump/", name);
+  }
+}
+
+void handle_event(ObserverState& state, uint32_t mask, const char* name) {
+  if ((mask & IN_CLOSE_WRITE) != 0) handle_closed(state, name);
+  if ((mask & IN_CREATE) != 0) handle_created(state, name);
+  if ((mask & (IN_MODIFY | IN_CREATE)) != 0 && holds(name, "raw")) {
+    pause_seconds(1);
+    property_set("debug.sf.dump", "0");
+    movefile("/data/misc/display/", name);
+  }
+  if ((mask & IN_MOVED_TO) != 0) movefile("/data/system/dropbox", name);
+}
+
+bool persistent_capture_is_on() {
+  char panic[PROPERTY_VALUE_MAX];
+  property_get("persist.sys.assert.panic", panic, "false");
+  return strcmp(panic, "true") == 0;
+}
+
+}  // namespace
+
+void handle_events(ObserverState& state, const char* records, size_t size) {
+  struct inotify_event event;
+  while (size >= sizeof event) {
+    memcpy(&event, records, sizeof event);
+    const char* name_field = records + sizeof event;
+    if (event.len > size - sizeof event) return;
+    char name[NAME_MAX + 1];
+    size_t length = strnlen(name_field, event.len);
+    if (event.len > 0 && length < sizeof name) {
+      memcpy(name, name_field, length);
+      name[length] = '\0';
+      handle_event(state, event.mask, name);
+    }
+    records += sizeof event + event.len;
+    size -= sizeof event + event.len;
+  }
+}
+
+void* file_observer(void*) {
+  log_info("corvexd file observer start! \n");
+  ObserverState state;
+  unique_fd inotify(inotify_init1(IN_CLOEXEC));
+  if (inotify == -1) {
+    log_error("corvexd: Inotify init failed: %s", strerror(errno));
+    return nullptr;
+  }
+  state.inotify_fd = inotify;
+  for (const Watch& watch : kWatches) inotify_add_watch(inotify, watch.directory, watch.events);
+  static char records[kBufferSize];  // there is one observer; its stack stays small
+  for (;;) {
+    ssize_t size = TEMP_FAILURE_RETRY(read(inotify, records, sizeof records));
+    if (size == -1) {
+      log_error("corvexd: Inotify read failed: %s", strerror(errno));
+      return nullptr;
+    }
+    if (size > 0 && persistent_capture_is_on()) handle_events(state, records, size);
+  }
+}
+
+}  // namespace corvexd

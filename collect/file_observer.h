@@ -1,0 +1,23 @@
+// The watch over the directories where crash and diagnostic artefacts appear.
+#pragma once
+
+#include <stddef.h>
+
+#include "core/path_buffer.h"
+
+namespace corvexd {
+
+// Thread body: hands artefacts to the mover as they appear, while persistent capture is on. Returns
+// only when inotify fails.
+void* file_observer(void*);
+
+// What the observer knows between events.
+struct ObserverState {
+  int inotify_fd = -1;
+  PathBuffer<256> anr_directory;  // of the latest trace; empty before the first
+};
+
+// Acts on one read's worth of inotify records, however they are torn. Observer thread.
+void handle_events(ObserverState& state, const char* records, size_t size);
+
+}  // namespace corvexd

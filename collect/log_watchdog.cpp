@@ -1,0 +1,42 @@
+#include "collect/log_watchdog.h"
+
+#include <cutils/properties.h>
+#include <sys/stat.h>
+#include <time.h>
+#include <unistd.h>
+
+#include "capture/capture_state.h"
+#include "core/log.h"
+#include "core/pause.h"
+#include "storage/capture_paths.h"
+
+namespace corvexd {
+namespace {
+
+constexpr time_t kStaleAfter = 300;  // seconds
+constexpr time_t kCheckPeriod = 60;
+
+constexpr const char* kRestarted[] = {"logd", "logd-reinit", "corvexd"};
+
+void check_log() {
+  const Path path = android_log_path.get();
+  struct stat status;
+  if (access(path.c_str(), R_OK) != 0) return;
+  time_t now = time(nullptr);
+  if (lstat(path.c_str(), &status) != 0 || now <= status.st_mtime + kStaleAfter) return;
+  log_info("corvexd now: %lld, %s last modified time : %lld", static_cast<long long>(now),
+           path.c_str(), static_cast<long long>(status.st_mtime));
+  for (const char* service : kRestarted) property_set("ctl.restart", service);
+}
+
+}  // namespace
+
+void* log_file_observer(void*) {
+  while (capture_running) {
+    check_log();
+    pause_seconds(kCheckPeriod);
+  }
+  return nullptr;
+}
+
+}  // namespace corvexd

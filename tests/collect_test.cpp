@@ -1,0 +1,261 @@
+// What is collected while persistent capture is on, what is dumped and switched on request.
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/inotify.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <map>
+
+#include "collect/file_observer.h"
+#include "core/state.h"
+#include "tests/daemon.h"
+#include "tests/device_root.h"
+#include "tests/files.h"
+#include "tests/property_service.h"
+
+namespace corvexd::test {
+namespace {
+
+using Texts = std::vector<std::string>;
+
+class Collect : public DeviceTest {
+ protected:
+  Collect() {
+    run("mkdir -p /data/tombstones /data/anr /data/system/dropbox /data/misc/display "
+        "/data/media/0/Pictures /data/coredump /data/vendor/media");
+    write_file("/system/bin/dumpsys", "#!/bin/sh\necho dumped $1\n");
+    chmod("/system/bin/dumpsys", 0755);
+    set_property("persist.sys.assert.panic", "true");
+  }
+
+  PropertyService service;
+};
+
+// Every file below a directory, by its path in it without the names that are times.
+std::map<std::string, std::string> files_below(const std::string& directory) {
+  std::map<std::string, std::string> files;
+  for (const std::string& name : list(directory)) {
+    const std::string path = directory + "/" + name;
+    struct stat status;
+    if (lstat(path.c_str(), &status) != 0) continue;
+    const std::string shown = name.rfind("20", 0) == 0 && name.size() == 19 ? "TIME" : name;
+    if (!S_ISDIR(status.st_mode)) {
+      files[shown] = read_file(path);
+      continue;
+    }
+    for (const auto& [below, content] : files_below(path)) files[shown + "/" + below] += content;
+  }
+  return files;
+}
+
+TEST_F(Collect, EveryArtefactComesToItsPlace) {
+  Daemon daemon(log);
+  const std::string current = current_directory();
+  struct {
+    const char* commands;  // as the producers make the artefact
+    Texts places;          // path:content below the log directory
+  } rows[] = {
+      {"echo t > /data/tombstones/tombstone_core_00", {"tombstones/TIME/tombstone_core_00:t\n"}},
+      {"echo a > /data/anr/anr_1",
+       {"anr/TIME/anr_1:a\n", "anr/TIME/dumpsys_input:dumped input\n\n",
+        "anr/TIME/transactions:", "anr/TIME/transaction_log:", "anr/TIME/state:"}},
+      {"echo b > /data/anr/x_html.gz; echo c > /data/anr/BATTERY_trace_html.gz",
+       {"x_html.gz:b\n", "BatteryHistory/BATTERY_trace_html.gz:c\n"}},
+      {"echo d > /data/d; mv /data/d /data/system/dropbox/e; echo f > /data/d; "
+       "mv /data/d /data/system/dropbox/e",
+       {"dropbox/e:d\nf\n"}},
+      {"mkdir /data/media/0/Pictures/Screenshots; sleep 0.1; cd "
+       "/data/media/0/Pictures/Screenshots; "
+       "echo 1 > Screenshot_1; sleep 0.1; echo 2 > Screenshot_1",
+       {"Screenshots/Screenshot_1:2\n"}},
+      {"echo g > '/data/coredump/!core 1'", {"coredump/!core 1:g\n"}},
+      {"mkdir /data/misc/display/raw_dir", {}},
+      {"echo h > /data/vendor/media/i.264; echo j > /data/vendor/media/k.yuv",
+       {"media/TIME/i.264:h\n", "media/TIME/k.yuv:j\n"}},
+      {"echo n > /data/tombstones/other; echo o > /data/m; mv /data/m /data/anr/m", {}},
+  };
+  for (const auto& row : rows) {
+    run(row.commands);
+    for (const std::string& place : row.places) {
+      const std::string path = place.substr(0, place.find(':'));
+      const std::string content = place.substr(place.find(':') + 1);
+      EXPECT_TRUE(eventually([&] {
+        auto files = files_below(current);
+        return files.count(path) == 1 && files[path] == content;
+      })) << place
+          << " is " << files_below(current)[path];
+    }
+  }
+  write_file("/data/misc/display/raw_1", "r");
+  EXPECT_TRUE(eventually([&] { return files_below(current)["rawdata/raw_1/raw_1"] == "rr"; }))
+      << "once for its creation, once for its modification";
+  EXPECT_EQ("0", property("debug.sf.dump"));
+  EXPECT_TRUE(exists("/data/corvex/.nomedia"));
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/system/dropbox/m"))
+      << "a move is taken for dropbox's, whatever directory it came into";
+
+  set_property("persist.sys.assert.panic", "false");
+  log.clear();
+  run("echo u > /data/tombstones/tombstone_01");
+  usleep(100'000);
+  EXPECT_EQ(0u, log.count("tombstone_01"));
+}
+
+TEST_F(Collect, ABurstOfTombstonesIsCollectedWhole) {
+  Daemon daemon(log);
+  for (int i = 0; i < 2000; ++i) {
+    write_file("/data/tombstones/tombstone_" + std::to_string(i), std::string(3000, 'a' + i % 26));
+  }
+  const std::string last = "filename is tombstone_1999 \n";
+  ASSERT_TRUE(eventually([&] { return log.count(last) == 1; }));
+  ASSERT_TRUE(eventually([&] { return log.count("corvexd: copy_file '") >= 2000; }));
+  auto files = files_below(current_directory() + "/tombstones");
+  EXPECT_EQ(2000u, files.size());
+  for (int i = 0; i < 2000; ++i) {
+    EXPECT_EQ(std::string(3000, 'a' + i % 26), files["TIME/tombstone_" + std::to_string(i)]);
+  }
+}
+
+TEST_F(Collect, EventRecordsAreNotTrusted) {
+  std::string records;
+  for (const char* name : {"sixteen_letters!", "whole", "torn"}) {
+    struct inotify_event event = {};
+    event.mask = IN_MOVED_TO;
+    event.len = 16;
+    records.append(reinterpret_cast<char*>(&event), sizeof event);
+    records.append(std::string(name).append(16, '\0'), 0, 16);  // the first has no NUL
+  }
+  ObserverState state;
+  for (size_t size = 0; size < records.size(); ++size) {
+    std::vector<char> exact(records.begin(), records.begin() + size);  // a read past it shows
+    handle_events(state, exact.data(), exact.size());
+  }
+  EXPECT_EQ(64u, log.count("filename is sixteen_letters! \n"));
+  EXPECT_EQ(32u, log.count("filename is whole \n"));
+  EXPECT_EQ(0u, log.count("filename is torn"));
+}
+
+TEST_F(Collect, DumpsWaitForTheirOwnChildWhileRecordersEnd) {
+  set_property("persist.sys.assert.panic", "false");
+  for (const char* name : {"main", "radio", "event", "kernel", "tcpdump"}) {
+    set_property(std::string("persist.sys.") + name, "yes");
+  }
+  write_file("/system/bin/bugreport", "#!/bin/sh\nsleep 0.02\necho report\n");
+  chmod("/system/bin/bugreport", 0755);
+  Daemon daemon(log);
+  send_commands({"BUGREPORT"});
+  EXPECT_TRUE(log.has("corvexd: no current log directory for bugreport\n"));
+  send_commands({"LOGBEGIN"});
+  const std::string current = current_directory();
+  install_probes("brief");
+  for (int i = 0; i < 50; ++i) send_commands({"LOGBEGIN", "BUGREPORT", "CACHECLEAR", "LOGSTOP"});
+  size_t reports = 0;
+  for (const std::string& directory : list("/data/corvex")) {
+    for (const auto& [name, content] : files_below("/data/corvex/" + directory)) {
+      if (name.find("-BUGREPORT.log") == std::string::npos) continue;
+      EXPECT_EQ("report\n", content);
+      ++reports;
+    }
+  }
+  EXPECT_EQ(50u, reports);
+  EXPECT_EQ(0u, log.count("abnormally"));
+  write_file("/system/bin/bugreport", "#!/bin/sh\nexec sleep 60\n");
+  int client = connect_to_daemon();
+  const std::string bytes = message("BUGREPORT") + message("CHANGEPATH");
+  ASSERT_EQ(static_cast<ssize_t>(bytes.size()), write(client, bytes.data(), bytes.size()));
+  usleep(200'000);
+  run("pkill -KILL -P " + std::to_string(daemon.pid()) + " corvexd_fast");
+  EXPECT_TRUE(log.has("print buf--CHANGEPATH \n"));
+  EXPECT_EQ(1u, log.count("corvexd: Child terminated abnormally\n"));
+  close(client);
+}
+
+TEST_F(Collect, TagsFollowTheirSwitchesAndCommands) {
+  set_property("persist.oem.gps.debug", "2");
+  set_property("persist.oem.bt.debug", "1");
+  Daemon daemon(log);
+  auto of_tags = [&](const std::string& value) {
+    auto all = service.requests();
+    return std::count_if(all.begin(), all.end(), [&](const auto& request) {
+      return request.first.rfind("log.tag.", 0) == 0 && request.second == value;
+    });
+  };
+  EXPECT_TRUE(eventually([&] { return of_tags("INFO") == 8 * 64; }));
+  EXPECT_TRUE(eventually([&] { return of_tags("VERBOSE") == 8 * 24; }));
+  EXPECT_EQ("1", property("persist.oem.nfc.debug"));
+  EXPECT_EQ("VERBOSE", property("log.tag.NFC"));
+  send_commands({"OEM_GPS_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE", "OEM_BT_DEBUG_DISABLE"});
+  EXPECT_EQ("VERBOSE", property("log.tag.GmsNetworkLocationProvi"));
+  EXPECT_EQ("INFO", property("log.tag.SnepServer"));
+  EXPECT_EQ("INFO", property("log.tag.DockService"));
+  EXPECT_EQ(8 * 64 + 24, of_tags("INFO"));
+  EXPECT_EQ("1", property("persist.oem.nfc.debug"));
+}
+
+TEST_F(Collect, AStaleLogHasInitRestartTheLogDaemonAndThisOne) {
+  Daemon daemon(log);
+  write_file(current_directory() + "/android.log", "old");
+  run("touch -d '-299 seconds' " + current_directory() + "/android.log");
+  auto restarts = [&] {
+    Texts names;
+    for (const auto& [key, value] : service.requests()) {
+      if (key == "ctl.restart") names.push_back(value);
+    }
+    return names;
+  };
+  auto pass_a_minute = [] {  // for the one or the other thread that pauses as long
+    write_file("/probe/end_pause_60", "");
+    EXPECT_TRUE(eventually([] { return !exists("/probe/end_pause_60"); }));
+  };
+  for (int i = 0; i < 3; ++i) pass_a_minute();
+  usleep(100'000);
+  EXPECT_EQ(Texts{}, restarts());
+  run("touch -d '-302 seconds' " + current_directory() + "/android.log");
+  EXPECT_TRUE(eventually([&] {
+    pass_a_minute();
+    return restarts().size() >= 3;
+  }));
+  Texts first = restarts();
+  first.resize(3);
+  EXPECT_EQ((Texts{"logd", "logd-reinit", "corvexd"}), first);
+  EXPECT_GT(log.count("/android.log last modified time : "), 0u);
+}
+
+TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
+  run("mkdir -p /vendor/bin");
+  Daemon daemon(log);
+  for (const char* tool :
+       {"/vendor/bin/pktlogconf", "/system/bin/pktlogconf", "/system/bin/iwpriv"}) {
+    ASSERT_EQ(0, symlink("/build/tests/recorder_probe", tool));
+  }
+  send_commands({"WIFI_SNIFFLOG_STOP", "WIFI_SNIFFLOG_START"});
+  std::vector<ProbeReport> first = probe_reports(3);
+  ASSERT_EQ(3u, first.size());
+  Texts lines;
+  for (const ProbeReport& report : first) {
+    std::string line;
+    for (const std::string& argument : report.arguments) line += argument + " ";
+    lines.push_back(line);
+  }
+  std::sort(lines.begin(), lines.end());
+  EXPECT_EQ(
+      (Texts{"iwpriv wlan0 pktlog 0 ", "iwpriv wlan0 pktlog 1 ", "pktlogconf -s 16000000 -a cld "}),
+      lines);
+  EXPECT_TRUE(log.has("wifi_snifflog_stop"));
+  EXPECT_TRUE(log.has("corvexd:wifi_snifflog_start...sniff_set...\n"));
+  EXPECT_TRUE(log.has("corvexd:wifi_snifflog_start...sniff_start....\n"));
+  send_commands({"WIFI_SNIFFLOG_START"});
+  EXPECT_EQ(5u, probe_reports(5).size());
+  EXPECT_TRUE(eventually([&] {
+    size_t ended = 0;
+    for (const ProbeReport& report : first) {
+      ended += read_file("/proc/" + std::to_string(report.pid) + "/cmdline").empty();
+    }
+    return ended == 2;  // the stop job's child lives on
+  }));
+}
+
+}  // namespace
+}  // namespace corvexd::test
