@@ -42,7 +42,7 @@ int run_starts() {
     clear_probe_reports();
     long long start = now();
     BootingDaemon daemon("/build/corvexd");
-    milliseconds.push_back(time_to_recorders(start, 4) / 1e6);
+    milliseconds.push_back(static_cast<double>(time_to_recorders(start, 4)) / 1e6);
   }
   std::sort(milliseconds.begin(), milliseconds.end());
   printf("start to fourth boot recorder, %d starts: median %.1f ms, from %.1f to %.1f ms\n",

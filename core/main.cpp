@@ -10,10 +10,11 @@
 #include "early/boot_log.h"
 #include "early/initial_log.h"
 
+namespace corvexd {
+
 // The start-up order: the boot recorders first, for the first lines of a boot are the ones that
 // matter; the data partition only when it can be used.
-int main() {
-  using namespace corvexd;
+[[noreturn]] static void run() {
   log_info("corvexd main start\n");
   choose_cache_directory();
   const bool force_encrypted = data_is_force_encrypted();
@@ -34,3 +35,7 @@ int main() {
   start_thread(log_file_observer);
   serve_clients();
 }
+
+}  // namespace corvexd
+
+int main() { corvexd::run(); }

@@ -1,5 +1,6 @@
 // The keywords of an fstab's options, and what their parameters mean.
 #include <android-base/logging.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 #include <unistd.h>
@@ -184,8 +185,7 @@ void append_option(char* options, int options_size, const char* option) {
   size_t used = strlen(options);
   size_t length = strlen(option);
   if (used + length + 1 >= static_cast<size_t>(options_size)) return;
-  memcpy(options + used, option, length);
-  memcpy(options + used + length, ",", 2);
+  snprintf(options + used, options_size - used, "%s,", option);
 }
 
 }  // namespace
