@@ -175,11 +175,14 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   }));
   EXPECT_TRUE(eventually([&] { return list(directory + "/boot_log").size() == 2; }));
   EXPECT_EQ("boot", read_file(directory + "/boot_log/android_boot.log"));
-  size_t alive = 0;
-  for (const ProbeReport& report : probe_reports(5)) {
-    alive += !read_file("/proc/" + std::to_string(report.pid) + "/cmdline").empty();
-  }
-  EXPECT_EQ(1u, alive) << "the capture's recorder goes on";
+  const std::vector<ProbeReport> recorders = probe_reports(5);
+  EXPECT_TRUE(eventually([&] {
+    size_t alive = 0;
+    for (const ProbeReport& report : recorders) {
+      alive += !read_file("/proc/" + std::to_string(report.pid) + "/cmdline").empty();
+    }
+    return alive == 1;
+  })) << "the capture's recorder goes on";
 }
 
 TEST_F(Startup, EachBootSetsTheFilesOfTheLastOneAside) {
