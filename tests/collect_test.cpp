@@ -63,12 +63,12 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
         "anr/TIME/transactions:", "anr/TIME/transaction_log:", "anr/TIME/state:"}},
       {"echo b > /data/anr/x_html.gz; echo c > /data/anr/BATTERY_trace_html.gz",
        {"x_html.gz:b\n", "BatteryHistory/BATTERY_trace_html.gz:c\n"}},
-      {"echo d > /data/d; mv /data/d /data/system/dropbox/e; echo f > /data/d; "
+      {"echo d > /data/d; mv /data/d /data/system/dropbox/e; sleep 0.5; echo f > /data/d; "
        "mv /data/d /data/system/dropbox/e",
        {"dropbox/e:d\nf\n"}},
-      {"mkdir /data/media/0/Pictures/Screenshots; sleep 0.1; cd "
+      {"mkdir /data/media/0/Pictures/Screenshots; sleep 0.5; cd "
        "/data/media/0/Pictures/Screenshots; "
-       "echo 1 > Screenshot_1; sleep 0.1; echo 2 > Screenshot_1",
+       "echo 1 > Screenshot_1; sleep 0.5; echo 2 > Screenshot_1",
        {"Screenshots/Screenshot_1:2\n"}},
       {"echo g > '/data/coredump/!core 1'", {"coredump/!core 1:g\n"}},
       {"mkdir /data/misc/display/raw_dir", {}},
