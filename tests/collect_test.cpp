@@ -106,7 +106,8 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
 TEST_F(Collect, ABurstOfTombstonesIsCollectedWhole) {
   Daemon daemon(log);
   for (int i = 0; i < 2000; ++i) {
-    write_file("/data/tombstones/tombstone_" + std::to_string(i), std::string(3000, 'a' + i % 26));
+    write_file("/data/tombstones/tombstone_" + std::to_string(i),
+               std::string(3000, static_cast<char>('a' + i % 26)));
   }
   const std::string last = "filename is tombstone_1999 \n";
   ASSERT_TRUE(eventually([&] { return log.count(last) == 1; }));
@@ -114,7 +115,8 @@ TEST_F(Collect, ABurstOfTombstonesIsCollectedWhole) {
   auto files = files_below(current_directory() + "/tombstones");
   EXPECT_EQ(2000u, files.size());
   for (int i = 0; i < 2000; ++i) {
-    EXPECT_EQ(std::string(3000, 'a' + i % 26), files["TIME/tombstone_" + std::to_string(i)]);
+    EXPECT_EQ(std::string(3000, static_cast<char>('a' + i % 26)),
+              files["TIME/tombstone_" + std::to_string(i)]);
   }
 }
 
@@ -129,7 +131,7 @@ TEST_F(Collect, EventRecordsAreNotTrusted) {
   }
   ObserverState state;
   for (size_t size = 0; size < records.size(); ++size) {
-    std::vector<char> exact(records.begin(), records.begin() + size);  // a read past it shows
+    std::vector<char> exact(records.c_str(), records.c_str() + size);  // a read past it shows
     handle_events(state, exact.data(), exact.size());
   }
   EXPECT_EQ(64u, log.count("filename is sixteen_letters! \n"));

@@ -84,16 +84,14 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   std::vector<ProbeReport> all = probe_reports(7);
   ASSERT_TRUE(log.has("corvexd: in function main, persist.sys.assert.panic = false\n"));
 
+  const std::string made = "corvexd: Log Directory created successfully, path is ";
   Texts lines = own_lines();
   lines.erase(std::unique(lines.begin(), lines.end()), lines.end());
   lines.resize(std::min<size_t>(lines.size(), 11));
   EXPECT_EQ((Texts{"corvexd main start\n", "put cache logs in /cache/ \n", "corvexd firing up\n",
-                   "corvexd: Log Directory created successfully, path is /cache/boot_log \n",
-                   "corvexd: executeOnBootLogcat start \n", layout_line, mount_line,
-                   "corvexd watchdogProp : false, log_path : data \n",
-                   "corvexd LOG_ROOT : /data/corvex\n",
-                   "corvexd: Log Directory created successfully, path is "
-                   "/cache/log_before_initial \n",
+                   made + "/cache/boot_log \n", "corvexd: executeOnBootLogcat start \n",
+                   layout_line, mount_line, "corvexd watchdogProp : false, log_path : data \n",
+                   "corvexd LOG_ROOT : /data/corvex\n", made + "/cache/log_before_initial \n",
                    "corvexd: in function main, persist.sys.assert.panic = false\n"}),
             lines);
   EXPECT_EQ((Texts{"logcat", "-f", "/cache/boot_log/android_boot.log", "-r", "8192", "-n", "1",
