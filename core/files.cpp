@@ -17,6 +17,14 @@ constexpr gid_t kSystemGroup = 1000;
 
 Directory open_directory(const char* path) { return Directory(opendir(path)); }
 
+Directory open_directory_at(int parent, const char* name) {
+  int fd = openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+  if (fd == -1) return nullptr;
+  Directory directory(fdopendir(fd));
+  if (!directory) close(fd);
+  return directory;
+}
+
 struct dirent* next_entry(const Directory& directory) {
   while (struct dirent* entry = readdir(directory.get())) {
     if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0) return entry;

@@ -13,8 +13,10 @@ struct CloseDirectory {
 };
 using Directory = std::unique_ptr<DIR, CloseDirectory>;
 
-// Opens a directory for listing, close-on-exec; null with errno set on failure.
+// Opens a directory for listing, close-on-exec; null with errno set on failure. The second one
+// opens an entry of the directory `parent`, and never what a link names.
 Directory open_directory(const char* path);
+Directory open_directory_at(int parent, const char* name);
 
 // The next entry that is neither "." nor ".."; null at the end. Valid until the next call.
 struct dirent* next_entry(const Directory& directory);

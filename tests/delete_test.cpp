@@ -1,7 +1,13 @@
 #include "storage/delete.h"
 
+#include <fcntl.h>
+#include <stdio.h>
 #include <sys/mount.h>
+#include <sys/stat.h>
 #include <unistd.h>
+
+#include <atomic>
+#include <thread>
 
 #include "tests/device_root.h"
 #include "tests/files.h"
@@ -39,6 +45,47 @@ TEST_F(Delete, GoesOnPastWhatCannotBeRemoved) {
   EXPECT_EQ(-1, remove_file("/data/corvex/b"));
   umount("/data/corvex/a/read_only");
   umount("/data/corvex/b/mounted");
+}
+
+TEST_F(Delete, EmptiesLargeAndDeepTrees) {
+  run("mkdir -p /data/corvex/large /data/corvex/deep");
+  run("cd /data/corvex/large && seq 100000 | xargs touch");
+  // One-letter directories, as many as a path of 1023 characters can name; then one more.
+  constexpr int kLevels = (1023 - 17) / 2;
+  auto dig = [](int levels) {
+    int fd = open("/data/corvex/deep", O_PATH);
+    for (int level = 0; level < levels; ++level) {
+      mkdirat(fd, "d", 0755);
+      int next = openat(fd, "d", O_PATH);
+      close(fd);
+      fd = next;
+    }
+    close(fd);
+  };
+  dig(kLevels);
+  EXPECT_EQ(0, deleteLog("/data/corvex"));
+  EXPECT_TRUE(list("/data/corvex").empty());
+  run("mkdir -p /data/corvex/deep /data/corvex/other");
+  dig(kLevels + 1);
+  EXPECT_EQ(-1, remove_file("/data/corvex/deep"));
+  EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/deep/d/"));
+  EXPECT_EQ(0, remove_file("/data/corvex/other"));
+}
+
+TEST_F(Delete, NobodyCanLeadTheWalkOutOfTheRoot) {
+  run("mkdir -p /data/corvex /data/outside && touch /data/outside/kept");
+  std::atomic<bool> done{false};
+  std::thread swapper([&done] {
+    while (!done) {
+      mkdir("/data/corvex/entry", 0755);
+      symlink("/data/outside", "/data/link");
+      renameat2(AT_FDCWD, "/data/link", AT_FDCWD, "/data/corvex/entry", RENAME_EXCHANGE);
+    }
+  });
+  for (int round = 0; round < 100'000; ++round) EXPECT_EQ(0, deleteLog("/data/corvex"));
+  done = true;
+  swapper.join();
+  EXPECT_TRUE(exists("/data/outside/kept"));
 }
 
 }  // namespace
