@@ -4,6 +4,8 @@
 #include <string.h>
 #include <sys/socket.h>
 
+#include <algorithm>
+
 using android::base::unique_fd;
 
 namespace corvexd::sim {
@@ -31,6 +33,10 @@ void Readers::serve(const struct pollfd* polls) {
     if (keep && (events & POLLOUT)) keep = send_lines(&reader);
     if (keep) kept.push_back(std::move(reader));
   }
+  // At last, for a line that one of them was to get another may have cleared.
+  kept.erase(std::remove_if(kept.begin(), kept.end(),
+                            [this](const Reader& reader) { return is_done(reader); }),
+             kept.end());
   readers_ = std::move(kept);
   if (polls[0].revents & POLLIN) accept_reader();
 }
@@ -41,7 +47,13 @@ void Readers::accept_reader() {
   if (reader.fd != -1) readers_.push_back(std::move(reader));
 }
 
-// Answers whether the reader is still there and has more to get.
+// Whether the reader has got all that it asked for, or what is left of it.
+bool Readers::is_done(const Reader& reader) const {
+  return reader.asked && reader.ends &&
+         !store_->has_more(reader.buffers, reader.position, reader.end);
+}
+
+// Answers whether the reader is still there.
 bool Readers::take_request(Reader* reader) {
   ReadRequest request;
   ssize_t count = recv(reader->fd, &request, sizeof request, 0);
@@ -56,14 +68,14 @@ bool Readers::take_request(Reader* reader) {
   reader->ends = request.operation == ReadRequest::kDump;
   reader->end = store_->end();
   if (!reader->ends) memset(&reader->end, 0xff, sizeof reader->end);
-  return !reader->ends || store_->has_more(reader->buffers, reader->position, reader->end);
+  return true;
 }
 
 bool Readers::send_lines(Reader* reader) {
   for (int i = 0; i < kLinesAtOnce; ++i) {
     LogPosition position = reader->position;
     const std::string* line = store_->take(reader->buffers, &position, reader->end);
-    if (line == nullptr) return !reader->ends;
+    if (line == nullptr) return true;
     if (send(reader->fd, line->data(), line->size(), MSG_NOSIGNAL) < 0) return errno == EAGAIN;
     reader->position = position;
   }

@@ -35,6 +35,7 @@ class Readers {
   };
 
   void accept_reader();
+  bool is_done(const Reader& reader) const;
   bool take_request(Reader* reader);
   bool send_lines(Reader* reader);
 
