@@ -23,6 +23,7 @@ namespace {
 
 constexpr mode_t kMarkerMode = 0644;
 
+// What does not fit is cut: an artefact with a very long name is kept under the part that fits.
 using LongPath = PathBuffer<256>;
 
 enum class Below { kNothing, kTimestamp, kName };  // a level below the category
@@ -78,15 +79,14 @@ void provide_media_marker() {
 
 void copy_to(const LongPath& source, const LongPath& destination, const char* name) {
   LongPath to(destination);
-  if (!source.fits_or_log() || !to.append(name).fits_or_log()) return;
-  copy_file(source.c_str(), to.c_str());
+  copy_file(source.c_str(), to.append(name).c_str());
 }
 
 void copy_artefact(const char* dir, const char* name, const LongPath& destination) {
   LongPath source;
   source.append(dir).append("/").append(name);
   struct stat status;
-  bool is_folder = source.fits() && lstat(source.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+  bool is_folder = lstat(source.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
   if (!is_folder) return copy_to(source, destination, name);
   Directory folder = open_directory(source.c_str());
   if (!folder) return;
@@ -104,6 +104,7 @@ int movefile(const char* dir, const char* name) {
   log_info("corvexd: notify has been triggerd! \n");
   log_error("corvexd: filepath is %s, filename is %s \n", dir, name);
   const Timestamp time = local_timestamp();
+  std::unique_lock<std::mutex> lock(current_directory_mutex);
   Path current;
   if (!find_current_directory(WhichMark::kLast, &current)) {
     if (errno != 0) log_error("corvexd: Error: %s\n", strerror(errno));
@@ -111,13 +112,13 @@ int movefile(const char* dir, const char* name) {
   }
   const Destination& row = find_destination(dir, name);
   const LongPath destination = destination_path(row, current, name, time);
-  if (!destination.fits_or_log()) return -1;
   if (row.replaces) {
     LongPath earlier(destination);
     earlier.append(name);
-    if (earlier.fits() && access(earlier.c_str(), R_OK) == 0) unlink(earlier.c_str());
+    if (access(earlier.c_str(), R_OK) == 0) unlink(earlier.c_str());
   }
   mkdirs(destination.c_str());
+  lock.unlock();
   log_error("corvexd: movefile: %s\n", destination.c_str());
   if (strstr(dir, "Screenshots") != nullptr) provide_media_marker();
   Directory source = open_directory(dir);

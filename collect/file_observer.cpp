@@ -16,6 +16,7 @@
 #include "core/pause.h"
 #include "core/state.h"
 #include "storage/copy.h"
+#include "storage/current_directory.h"
 #include "storage/mkdirs.h"
 
 using android::base::unique_fd;
@@ -28,7 +29,7 @@ constexpr char kScreenshots[] = "/data/media/0/Pictures/Screenshots";
 constexpr uint32_t kScreenshotEvents = IN_MODIFY | IN_CLOSE_WRITE | IN_CREATE;
 constexpr char kTraces[] = "/data/anr/";
 
-using LongPath = PathBuffer<256>;
+using LongPath = PathBuffer<256>;  // what does not fit is cut
 
 struct Watch {
   const char* directory;
@@ -81,7 +82,6 @@ void complete_trace(const ObserverState& state, const char* name) {
   LongPath source, target(state.anr_directory);
   source.append(kTraces).append("/").append(name);
   target.append("/").append(name);
-  if (!source.fits_or_log() || !target.fits_or_log()) return;
   if (access(target.c_str(), R_OK) == 0 && unlink(target.c_str()) != 0) {
     log_error("corvexd: can't remove %s'", target.c_str());
   }
@@ -91,7 +91,7 @@ void complete_trace(const ObserverState& state, const char* name) {
 void dump_input(const LongPath& directory) {
   LongPath line;
   line.append("/system/bin/dumpsys input | xargs -0 echo > ");
-  if (!line.append(directory.c_str()).append("dumpsys_input&").fits_or_log()) return;
+  line.append(directory.c_str()).append("dumpsys_input&");
   if (FILE* pipe = popen(line.c_str(), "re")) {
     pause_seconds(1);
     pclose(pipe);
@@ -102,13 +102,16 @@ void dump_input(const LongPath& directory) {
 void begin_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
   LongPath directory;
-  directory.append(LOG_DIR.get().c_str()).append("/anr/");
-  if (!directory.append(local_timestamp().c_str()).append("/").fits_or_log()) return;
+  {
+    std::lock_guard<std::mutex> lock(current_directory_mutex);
+    directory.append(LOG_DIR.get().c_str()).append("/anr/");
+    directory.append(local_timestamp().c_str()).append("/");
+    mkdirs(directory.c_str());
+  }
   state.anr_directory = directory;
-  mkdirs(directory.c_str());
   for (const BinderState& binder : kBinderStates) {
     LongPath target(directory);
-    if (target.append(binder.name).fits_or_log()) copy_file(binder.source, target.c_str());
+    copy_file(binder.source, target.append(binder.name).c_str());
   }
   dump_input(directory);
 }

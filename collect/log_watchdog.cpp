@@ -22,8 +22,8 @@ void check_log() {
   const Path path = android_log_path.get();
   struct stat status;
   if (access(path.c_str(), R_OK) != 0) return;
-  time_t now = time(nullptr);
-  if (lstat(path.c_str(), &status) != 0 || now <= status.st_mtime + kStaleAfter) return;
+  const time_t now = time(nullptr);
+  if (lstat(path.c_str(), &status) != 0 || now - kStaleAfter <= status.st_mtime) return;
   log_info("corvexd now: %lld, %s last modified time : %lld", static_cast<long long>(now),
            path.c_str(), static_cast<long long>(status.st_mtime));
   for (const char* service : kRestarted) property_set("ctl.restart", service);

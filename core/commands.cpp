@@ -13,6 +13,7 @@
 #include "core/log.h"
 #include "core/state.h"
 #include "storage/capture_paths.h"
+#include "storage/current_directory.h"
 #include "storage/delete.h"
 #include "storage/log_directory.h"
 #include "thermal/thermal_sampler.h"
@@ -22,8 +23,11 @@ namespace {
 
 void begin_capture(int) {
   checkLogPath();
-  renameLastDirectoryName();
-  createLogDirectory();
+  {
+    std::lock_guard<std::mutex> lock(current_directory_mutex);
+    renameLastDirectoryName();
+    createLogDirectory();
+  }
   makeLogAbsolutePath();
   executeLogcat();
 }

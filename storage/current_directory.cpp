@@ -8,6 +8,8 @@
 
 namespace corvexd {
 
+std::mutex current_directory_mutex;
+
 bool find_current_directory(WhichMark which, Path* path) {
   const char* root_path = LOG_ROOT;
   Directory root = open_directory(root_path);
