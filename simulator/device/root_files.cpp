@@ -92,6 +92,7 @@ constexpr struct {
     {"simulator/programs/dumpsys", "system/bin/dumpsys"},
     {"simulator/programs/firmware", "system/bin/firmware"},
     {"simulator/programs/make_nodes", "system/bin/make_nodes"},
+    {"simulator/programs/scenario", "system/bin/scenario"},
     {"simulator/programs/start_storage", "system/bin/start_storage"},
     {"simulator/programs/pktlogconf", "vendor/bin/pktlogconf"},
     {"simulator/programs/iwpriv", "vendor/bin/iwpriv"},

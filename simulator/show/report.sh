@@ -1,9 +1,11 @@
-# bash -s NAME SECONDS ROOT USER, in the device: shows the newest log directory and checks that all
-# input is in it. ROOT is where the device's root lies on the machine, USER who runs the device.
+# bash -s NAME SECONDS ROOT USER MADE, in the device: shows the newest log directory and checks that
+# all input is in it. ROOT is where the device's root lies on the machine, USER who runs the device,
+# MADE what `scenario all` said.
 name=$1
 seconds=$2
 root=$3
 user=$4
+made=$5
 logs=/data/corvex
 missing=0
 
@@ -47,6 +49,58 @@ check_thermal() {
         { sub(/[^,]*/, ""); if (!seen[$0]++) different++ }
         END { exit !(NR >= samples && good == NR && different > 1) }' kv_tsen_data/* ||
         complain "the thermal record is not as it should be"
+}
+
+# check_artefact SCENARIO FOLDER: what the scenario made was collected under FOLDER, a pattern.
+check_artefact() {
+    local sources source
+    sources=$(sed -n "s/^$1: //p" <<<"$made")
+    [ "$sources" ] || complain "an artefact of the scenario $1"
+    for source in $sources; do
+        # shellcheck disable=SC2086 # a pattern
+        cmp "$source" $2/"${source##*/}" || complain "$source, collected whole in $2/"
+    done
+}
+
+# A dump is collected anew with each change that is seen of it, one copy behind the other: the last
+# is whole. And the display has been told to end its dumping.
+check_dump() {
+    local dump name
+    dump=$(sed -n 's/^display: //p' <<<"$made")
+    if [ -z "$dump" ]; then
+        complain "an artefact of the scenario display"
+        return
+    fi
+    name=${dump##*/}
+    tail -c "$(stat -c %s "$dump")" "rawdata/$name/$name" | cmp - "$dump" ||
+        complain "$dump, collected whole in rawdata/$name/"
+    [ "$(getprop debug.sf.dump)" = 0 ] || complain "the end of the dumping of the display"
+}
+
+# What goes with a trace: the state of the binder calls and of the input devices at that moment.
+check_trace() {
+    local file
+    for file in transactions transaction_log state; do
+        cmp "/dev/nodes/proc/proc_$file" anr/*/"$file" || complain "anr/*/$file, as it was at the trace"
+    done
+    grep -q "INPUT MANAGER" anr/*/dumpsys_input || complain "anr/*/dumpsys_input"
+}
+
+check_artefacts() {
+    check_artefact tombstone 'tombstones/*'
+    check_artefact anr 'anr/*'
+    check_artefact dropbox dropbox
+    check_artefact screenshot Screenshots
+    check_artefact coredump coredump
+    check_artefact media 'media/*'
+    check_dump
+    check_trace
+    [ -e "$logs/.nomedia" ] || complain "$logs/.nomedia, for the screenshot's sake"
+}
+
+check_bugreport() {
+    [ "$(sed -n '1p;$p' ./*-BUGREPORT.log | grep -c "^== bugreport[: ]")" = 2 ] ||
+        complain "a whole bug report"
 }
 
 list() {
@@ -140,7 +194,9 @@ check_firmware qsee
 check_firmware tz
 check_bootloader
 check_thermal
+check_bugreport
+check_artefacts
 [ "$missing" = 0 ] || exit 1
-echo "every line written was recorded; the capture lies in"
+echo "every line written was recorded, every artefact collected; the capture lies in"
 echo "$root$PWD"
 [ "$user" = 0 ] || echo "(its files belong to users of the device: ./dev shell reads them)"
