@@ -43,6 +43,7 @@ void shut_down() {
 
 int run() {
   umask(0);
+  fcntl(kReadyFd, F_SETFD, FD_CLOEXEC);
   unique_fd signals = take_signals();
   Services services;
   PropertyService property_service(&services);
