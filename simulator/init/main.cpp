@@ -1,4 +1,5 @@
 // The device's first process: serves the properties and keeps the services running.
+#include <fcntl.h>
 #include <signal.h>
 #include <stdio.h>
 #include <sys/signalfd.h>
