@@ -81,6 +81,11 @@ void open_control_socket() {
   listening_socket = fd;
 }
 
+void serve_connection(int connection) {
+  while (serve_message(connection)) {
+  }
+}
+
 void serve_clients() {
   for (;;) {
     int connection = accept4(listening_socket, nullptr, nullptr, SOCK_CLOEXEC);
@@ -90,8 +95,7 @@ void serve_clients() {
     }
     client_connection = connection;
     log_info("new connection\n");
-    while (serve_message(connection)) {
-    }
+    serve_connection(connection);
     log_info("closing connection\n");
     // Readers forked meanwhile hold a copy of the descriptor; the client is to see the end now.
     shutdown(connection, SHUT_RDWR);

@@ -15,8 +15,11 @@ void keep_control_socket();
 // there is none or it cannot listen.
 void open_control_socket();
 
-// Serves one client after another, one command after another, on the calling (main) thread, for
-// the rest of the process's life.
+// Runs one client's commands, one after another, until its connection is of no more use; the caller
+// closes it. Main thread.
+void serve_connection(int connection);
+
+// Serves one client after another on the calling (main) thread, for the rest of the process's life.
 [[noreturn]] void serve_clients();
 
 }  // namespace corvexd

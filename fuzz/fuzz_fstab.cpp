@@ -1,14 +1,8 @@
 // Any bytes as an fstab: read, asked, released.
-#include <android-base/logging.h>
 #include <stdint.h>
 #include <stdio.h>
 
 #include "fs_mgr/fs_mgr_fstab.h"
-
-extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  android::base::SetLogger([](auto...) {});  // what it says of bad lines is not looked at
-  return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size == 0) return 0;
