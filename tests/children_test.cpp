@@ -6,6 +6,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 #include <set>
 #include <sstream>
@@ -14,8 +15,6 @@
 #include "core/local_time.h"
 #include "core/log.h"
 #include "tests/daemon.h"
-#include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
@@ -36,6 +35,11 @@ void live(const void*) {
   while (true) pause();
 }
 
+void live_on(const void*) {
+  signal(SIGTERM, SIG_IGN);
+  live(nullptr);
+}
+
 void allocate(size_t size) {
   void* volatile memory = malloc(size);  // volatile: or the pair is optimised away
   free(memory);
@@ -46,6 +50,7 @@ void allocate(size_t size) {
 void work_and_end(const void*) {
   for (int i = 0; i < 20 && !kSanitized; ++i) allocate(64 << (i % 12));
   log_debug("%s\n", local_timestamp().c_str());
+  raise(SIGCHLD);  // a child may have children, too
 }
 
 // Makes a process with exactly this number in the pid namespace of the test.
@@ -86,16 +91,27 @@ TEST_F(Children, NoSignalReachesARecycledNumber) {
   EXPECT_EQ(1u, log.texts().size());
 }
 
+TEST_F(Children, AChildThatEndsAtOnceIsFoundInItsSlot) {
+  handle_ended_children();
+  for (int i = 0; i < 300; ++i) {
+    start_child(slots[0], end_at_once, nullptr);
+    ASSERT_TRUE(eventually([] { return !slots[0].running; })) << i;
+  }
+}
+
 TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   // A handler that interrupts an allocation waits for the log's reader, who allocates as well here.
   log.stop();
   ASSERT_NE(nullptr, freopen("/dev/null", "w", stderr));
   handle_ended_children();
   std::atomic<bool> done{false};
+  ChildSlot stubborn;
+  start_child(stubborn, live_on, nullptr);
   std::vector<std::thread> threads;
   for (int i = 0; i < 3; ++i) {
-    threads.emplace_back([&done, i] {
+    threads.emplace_back([&done, &stubborn, i] {
       unsigned size = 1;
+      while (!done && i == 0) terminate_child(stubborn);
       while (!done) {
         size = size * 1103515245 + 12345;
         allocate(size % 70'000);
@@ -115,7 +131,6 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   std::set<pid_t> started;
   for (int round = 0; round < kRounds; ++round) {
     ChildSlot& slot = slots[round % 4];
-    terminate_child(slot);
     start_child(slot, round % 2 == 0 ? work_and_end : end_at_once, nullptr);
     ASSERT_GT(slot.pid, 0);
     started.insert(slot.pid);
@@ -124,6 +139,8 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   storm.join();
   for (std::thread& thread : threads) thread.join();
   signal(SIGCHLD, SIG_DFL);
+  kill(stubborn.pid, SIGKILL);
+  started.insert(stubborn.pid);
   // Every child was either reaped by the handler, and its slot knows, or is there to be reaped now.
   while (true) {
     pid_t pid = waitpid(-1, nullptr, 0);
@@ -152,12 +169,9 @@ Usage usage_of(pid_t pid) {
 
 // How often the handler says it has reaped a child.
 size_t reaped_children(LogCatcher& log) {
-  size_t count = 0;
-  for (const std::string& text : log.texts()) {
-    size_t at = text.find(", pid = ");
-    if (at != std::string::npos && atoi(text.c_str() + at + 8) > 0) ++count;
-  }
-  return count;
+  Texts lines = log.texts({", pid = 0\n", ", pid = -1\n"});
+  return std::count_if(lines.begin(), lines.end(),
+                       [](const auto& line) { return line.find(", pid = ") != std::string::npos; });
 }
 
 // From now on the lowest free numbers are given out again.
@@ -186,11 +200,8 @@ class Bystanders {
 };
 
 TEST_F(Children, TwoHundredCapturesLeaveNothingBehind) {
-  write_file("/system/bin/getprop", "#!/bin/sh\n");
-  run("chmod 755 /system/bin/getprop");
-  for (const char* name : {"main", "radio", "event", "kernel", "tcpdump"}) {
-    set_property(std::string("persist.sys.") + name, "yes");
-  }
+  write_script("/system/bin/getprop", "");
+  switch_on({"main", "radio", "event", "kernel", "tcpdump"});
   Daemon daemon(log);
   send_commands({"LOGSTOP"});
   // The thread sanitizer adds one of its own beside the first thread that is started.

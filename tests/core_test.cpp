@@ -1,9 +1,8 @@
-#include <cutils/properties.h>
 #include <signal.h>
-#include <time.h>
-#include <unistd.h>
+#include <sys/time.h>
 
 #include <atomic>
+#include <chrono>
 #include <thread>
 
 #include "core/path_buffer.h"
@@ -48,19 +47,12 @@ TEST_F(Core, PublishedPathIsNeverAMixture) {
 
 TEST_F(Core, PauseLastsThoughSignalsInterruptIt) {
   signal(SIGALRM, [](int) {});
-  struct itimerspec often = {{0, 1'000'000}, {0, 1'000'000}};
-  timer_t timer;
-  struct sigevent event = {};
-  event.sigev_notify = SIGEV_SIGNAL;
-  event.sigev_signo = SIGALRM;
-  ASSERT_EQ(0, timer_create(CLOCK_MONOTONIC, &event, &timer));
-  timer_settime(timer, 0, &often, nullptr);
-  struct timespec start, end;
-  clock_gettime(CLOCK_MONOTONIC, &start);
+  const struct itimerval often = {{0, 1000}, {0, 1000}}, never = {};
+  setitimer(ITIMER_REAL, &often, nullptr);
+  const auto start = std::chrono::steady_clock::now();
   pause_seconds(1);
-  clock_gettime(CLOCK_MONOTONIC, &end);
-  timer_delete(timer);
-  EXPECT_GE((end.tv_sec - start.tv_sec) * 1000 + (end.tv_nsec - start.tv_nsec) / 1'000'000, 1000);
+  EXPECT_GE(std::chrono::steady_clock::now() - start, std::chrono::seconds(1));
+  setitimer(ITIMER_REAL, &never, nullptr);
 }
 
 TEST_F(Core, SettingsComeFromTheirPropertiesOrDefaults) {
@@ -78,9 +70,7 @@ TEST_F(Core, SettingsComeFromTheirPropertiesOrDefaults) {
   EXPECT_STREQ("30", android_lognum);
   EXPECT_STREQ("20480", kernel_logsize);
   EXPECT_STREQ("3", tcpdump_lognum);
-  EXPECT_TRUE(
-      log.has("corvexd: persist.sys.radio.lognum is too long, \"5\" is used instead of "
-              "\"12345678\"\n"));
+  EXPECT_EQ(1u, log.count("persist.sys.radio.lognum is too long"));
 }
 
 TEST_F(Core, LogRootFollowsItsTwoProperties) {
@@ -98,9 +88,7 @@ TEST_F(Core, LogRootFollowsItsTwoProperties) {
     EXPECT_EQ(root, LOG_ROOT.load()) << row.watchdog << row.path;
     EXPECT_EQ(root + "/KVBR_", LOG_PATH.load());
     EXPECT_EQ(row.in_data, isInDataPartition == 1);
-    EXPECT_TRUE(log.has("corvexd LOG_ROOT : " + root + "\n"));
   }
-  EXPECT_TRUE(log.has("corvexd watchdogProp : false, log_path : data  \n"));
 }
 
 }  // namespace

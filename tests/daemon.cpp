@@ -1,33 +1,28 @@
 #include "tests/daemon.h"
 
-#include <gtest/gtest.h>
+#include <fcntl.h>
 #include <signal.h>
-#include <string.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <sstream>
-
-#include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
 
 const struct sockaddr_un kAddress = {AF_UNIX, "/dev/socket/corvexd"};
-const struct sockaddr* address() { return reinterpret_cast<const struct sockaddr*>(&kAddress); }
 
 }  // namespace
 
 BootingDaemon::BootingDaemon(const char* program) {
-  unlink(kAddress.sun_path);
-  int fd = socket(AF_UNIX, SOCK_STREAM, 0);
-  EXPECT_EQ(0, bind(fd, address(), sizeof kAddress));
+  int fd = bound_socket(SOCK_STREAM, kAddress.sun_path);
   std::string number = std::to_string(fd);
   pid_ = fork();
   if (pid_ == 0) {
+    fcntl(fd, F_SETFD, 0);
     close_range(3, fd - 1, 0);
     close_range(fd + 1, ~0u, 0);
     setenv("ANDROID_SOCKET_corvexd", number.c_str(), 1);
@@ -49,9 +44,8 @@ void make_device_ready() {
   write_file("/cache/fileAfter911", "");
 }
 
-// The probe is there already when this device starts its daemon.
 Daemon::Daemon(LogCatcher& log, const char* program)
-    : BootingDaemon((make_device_ready(), install_probes("live"), program)) {
+    : BootingDaemon((make_device_ready(), program)) {
   close(connect_to_daemon());
   probe_reports(4);
   clear_probe_reports();
@@ -64,27 +58,34 @@ std::string message(const std::string& command) {
   return std::string(reinterpret_cast<char*>(&length), sizeof length) + command;
 }
 
-int connect_to_daemon() {
+int try_to_connect() {
   int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-  EXPECT_TRUE(eventually([&] { return connect(fd, address(), sizeof kAddress) == 0; }));
+  const auto* address = reinterpret_cast<const struct sockaddr*>(&kAddress);
+  if (connect(fd, address, sizeof kAddress) == 0) return fd;
+  close(fd);
+  return -1;
+}
+
+int connect_to_daemon() {
+  int fd = -1;
+  EXPECT_TRUE(eventually([&] { return (fd = try_to_connect()) != -1; }));
   return fd;
 }
 
-std::string send_bytes(const std::string& bytes) {
-  int fd = connect_to_daemon();
-  EXPECT_EQ(static_cast<ssize_t>(bytes.size()), send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL));
-  shutdown(fd, SHUT_WR);
-  std::string reply;
-  char buffer[256];
-  for (ssize_t count; (count = read(fd, buffer, sizeof buffer)) > 0;) reply.append(buffer, count);
-  close(fd);
-  return reply;
+void send_all(int connection, const std::string& bytes) {
+  EXPECT_EQ(static_cast<ssize_t>(bytes.size()),
+            send(connection, bytes.data(), bytes.size(), MSG_NOSIGNAL));
 }
 
-std::string send_commands(const std::vector<std::string>& commands) {
+std::string send_commands(const Texts& commands) {
   std::string bytes;
   for (const std::string& command : commands) bytes += message(command);
-  return send_bytes(bytes);
+  int fd = connect_to_daemon();
+  send_all(fd, bytes);
+  shutdown(fd, SHUT_WR);
+  std::string reply = read_to_end(fd);
+  close(fd);
+  return reply;
 }
 
 void install_probes(const std::string& mode) {
@@ -115,7 +116,21 @@ std::vector<ProbeReport> probe_reports(size_t count) {
     return reports.size() >= count;
   });
   EXPECT_EQ(count, reports.size());
+  reports.resize(std::max(count, reports.size()), {0, {}, {"never started"}});
   return reports;
+}
+
+Texts command_lines(const std::vector<ProbeReport>& reports) {
+  Texts lines;
+  for (const ProbeReport& report : reports) {
+    std::string line;
+    for (const std::string& argument : report.arguments) {
+      bool quoted = argument.empty() || argument.find(' ') != std::string::npos;
+      line += (line.empty() ? "" : " ") + (quoted ? "'" + argument + "'" : argument);
+    }
+    lines.push_back(line);
+  }
+  return lines;
 }
 
 std::string current_directory(const std::string& root) {

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/log_catcher.h"
+#include "tests/device_root.h"
 
 namespace corvexd::test {
 
@@ -35,19 +35,24 @@ void make_device_ready();
 // One message as it goes over the wire.
 std::string message(const std::string& command);
 
-// A new connection to the control socket; waits up to ten seconds for one that listens.
+// A new connection to the control socket, or -1 when nobody listens.
+int try_to_connect();
+
+// The same, waited for.
 int connect_to_daemon();
 
-// Sends the bytes over a connection of their own, closes its sending end, and returns what came
-// until the daemon ended the connection.
-std::string send_bytes(const std::string& bytes);
-std::string send_commands(const std::vector<std::string>& commands);
+// Sends all of it over a connection.
+void send_all(int connection, const std::string& bytes);
+
+// Sends them over a connection of their own, closes its sending end, and returns what came until
+// the daemon ended the connection.
+std::string send_commands(const Texts& commands);
 
 // What a recorder found at its start.
 struct ProbeReport {
   pid_t pid;
-  std::vector<std::string> arguments;
-  std::vector<std::string> rest;  // its signals and descriptors, and last "started" and when
+  Texts arguments;
+  Texts rest;  // its signals and descriptors, and last "started" and when
 };
 
 // Puts the probe at the recorders' paths, in the given mode: "live", "die" at once, "brief" (end
@@ -57,8 +62,12 @@ void install_probes(const std::string& mode);
 // Forgets every report so far.
 void clear_probe_reports();
 
-// Every report so far, in the order of the process numbers, after waiting for `count` of them.
+// Every report so far, in the order of the process numbers, after waiting for `count` of them. When
+// fewer come, the test fails, and reports of none are added.
 std::vector<ProbeReport> probe_reports(size_t count);
+
+// What each was started with, as one would type it.
+Texts command_lines(const std::vector<ProbeReport>& reports);
 
 // The full path of the one directory marked "_current" under a log root; empty for none.
 std::string current_directory(const std::string& root = "/data/corvex");

@@ -1,7 +1,6 @@
 #include "storage/delete.h"
 
 #include <fcntl.h>
-#include <stdio.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -10,7 +9,6 @@
 #include <thread>
 
 #include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
@@ -36,8 +34,8 @@ TEST_F(Delete, GoesOnPastWhatCannotBeRemoved) {
   ASSERT_EQ(0, mount("x", "/data/corvex/a/read_only", "tmpfs", MS_RDONLY, nullptr));
   ASSERT_EQ(0, mount("x", "/data/corvex/b/mounted", "tmpfs", 0, nullptr));
   EXPECT_EQ(0, deleteLog("/data/corvex"));
-  EXPECT_EQ((std::vector<std::string>{"a", "b"}), list("/data/corvex"));
-  EXPECT_EQ((std::vector<std::string>{"read_only"}), list("/data/corvex/a"));
+  EXPECT_EQ((Texts{"a", "b"}), list("/data/corvex"));
+  EXPECT_EQ(Texts{"read_only"}, list("/data/corvex/a"));
   EXPECT_TRUE(log.has("corvexd: descend into directory '/data/corvex/a/read_only'? "));
   EXPECT_TRUE(log.has("corvexd: can't remove '/data/corvex/a'"));
   EXPECT_TRUE(log.has("corvexd: can't remove '/data/corvex/b/mounted'"));
@@ -48,25 +46,14 @@ TEST_F(Delete, GoesOnPastWhatCannotBeRemoved) {
 }
 
 TEST_F(Delete, EmptiesLargeAndDeepTrees) {
-  run("mkdir -p /data/corvex/large /data/corvex/deep");
-  run("cd /data/corvex/large && seq 100000 | xargs touch");
+  run("mkdir -p /data/corvex/large && cd /data/corvex/large && seq 100000 | xargs touch");
   // One-letter directories, as many as a path of 1023 characters can name; then one more.
-  constexpr int kLevels = (1023 - 17) / 2;
-  auto dig = [](int levels) {
-    int fd = open("/data/corvex/deep", O_PATH);
-    for (int level = 0; level < levels; ++level) {
-      mkdirat(fd, "d", 0755);
-      int next = openat(fd, "d", O_PATH);
-      close(fd);
-      fd = next;
-    }
-    close(fd);
-  };
-  dig(kLevels);
+  std::string deep = "/data/corvex/deep";
+  while (deep.size() + 2 <= 1023) deep += "/d";
+  run("mkdir -p " + deep);
   EXPECT_EQ(0, deleteLog("/data/corvex"));
-  EXPECT_TRUE(list("/data/corvex").empty());
-  run("mkdir -p /data/corvex/deep /data/corvex/other");
-  dig(kLevels + 1);
+  EXPECT_EQ(Texts{}, list("/data/corvex"));
+  run("mkdir -p " + deep + "/d /data/corvex/other");
   EXPECT_EQ(-1, remove_file("/data/corvex/deep"));
   EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/deep/d/"));
   EXPECT_EQ(0, remove_file("/data/corvex/other"));

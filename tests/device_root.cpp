@@ -1,6 +1,5 @@
 #include "tests/device_root.h"
 
-#include <fcntl.h>
 #include <sched.h>
 #include <signal.h>
 #include <sys/mount.h>
@@ -12,7 +11,7 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "tests/files.h"
+#include "tests/daemon.h"
 
 namespace corvexd::test {
 namespace {
@@ -64,8 +63,6 @@ int wait_for_all(pid_t pid) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
-void empty_directory(const std::string& path) { run("rm -rf " + path + " && mkdir -p " + path); }
-
 }  // namespace
 
 void enter_device_root() {
@@ -90,15 +87,15 @@ void enter_device_root() {
 bool owners_work() { return entered_as_root; }
 
 void make_empty_device() {
-  for (const char* path : {"/data", "/cache", "/storage", "/system", "/vendor", "/probe",
-                           "/dev/socket", "/dev/__properties__"}) {
-    empty_directory(path);
-  }
-  run("mkdir -p /data/corvex /storage/emulated/0 /system/bin /system/xbin");
+  run("rm -rf /data /cache /storage /system /vendor /probe /dev/socket /dev/__properties__");
+  run("mkdir -p /data/corvex /cache /storage/emulated/0 /system/bin /system/xbin /vendor /probe "
+      "/dev/socket /dev/__properties__");
 }
 
 DeviceTest::DeviceTest() {
+  umask(077);
   make_empty_device();
+  install_probes("live");
   log.start();
 }
 
@@ -106,6 +103,10 @@ void set_property(const std::string& key, const std::string& value) {
   const std::string draft = "/dev/draft." + key;
   write_file(draft, value);
   rename(draft.c_str(), ("/dev/__properties__/" + key).c_str());
+}
+
+void switch_on(const Texts& names) {
+  for (const std::string& name : names) set_property("persist.sys." + name, "yes");
 }
 
 }  // namespace corvexd::test

@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "tests/files.h"
 #include "tests/log_catcher.h"
 
 namespace corvexd::test {
@@ -20,7 +21,8 @@ void make_empty_device();
 // Whether files can be given to other users here: not without root.
 bool owners_work();
 
-// An empty device: its directories, no property set, its log caught.
+// An empty device with the probe as its recorders, its log caught, under a umask that whatever is
+// made must not depend on.
 class DeviceTest : public testing::Test {
  protected:
   DeviceTest();
@@ -30,5 +32,8 @@ class DeviceTest : public testing::Test {
 
 // As whoever sets properties on a device does it: replaced whole, by rename.
 void set_property(const std::string& key, const std::string& value);
+
+// Sets the recorders' switches of these names to "yes".
+void switch_on(const Texts& names);
 
 }  // namespace corvexd::test

@@ -1,4 +1,4 @@
-// The file system as the tests handle it.
+// The file system, processes and sockets as the tests handle them.
 #pragma once
 
 #include <sys/types.h>
@@ -9,17 +9,30 @@
 
 namespace corvexd::test {
 
+using Texts = std::vector<std::string>;
+
 std::string read_file(const std::string& path);
+std::string read_to_end(int fd);
 void write_file(const std::string& path, const std::string& content);
+void write_script(const std::string& path, const std::string& commands);
 bool exists(const std::string& path);
 mode_t mode_of(const std::string& path);
 bool is_systems(const std::string& path);  // owner and group 1000
 
 // The names in a directory, sorted, without "." and "..".
-std::vector<std::string> list(const std::string& path);
+Texts list(const std::string& path);
 
 // Runs a shell command; a failure fails the test.
 void run(const std::string& command);
+
+// Runs this in a child; its exit status, 0 when it returns, -1 when a signal ended it.
+int status_in_child(const std::function<void()>& body);
+
+// Whether the process has ended, be it as a zombie.
+bool has_ended(pid_t pid);
+
+// A socket of this type with this path; it does not listen yet.
+int bound_socket(int type, const char* path);
 
 // Asks `done` until it is true, for ten seconds at most; whether it came to that.
 bool eventually(const std::function<bool()>& done);

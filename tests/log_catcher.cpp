@@ -9,21 +9,20 @@
 
 #include <algorithm>
 
-#include "tests/files.h"
-
 namespace corvexd::test {
 namespace {
 
-constexpr char kSocketPath[] = "/dev/socket/logdw";
+const struct sockaddr_un kAddress = {AF_UNIX, "/dev/socket/logdw"};
 constexpr size_t kHeaderSize = 11;
+
+bool holds(const std::string& text, const std::string& part) {
+  return text.find(part) != std::string::npos;
+}
 
 }  // namespace
 
 void LogCatcher::start() {
-  socket_ = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
-  struct sockaddr_un address = {AF_UNIX, ""};
-  strcpy(address.sun_path, kSocketPath);
-  ASSERT_EQ(0, bind(socket_, reinterpret_cast<sockaddr*>(&address), sizeof address));
+  socket_ = bound_socket(SOCK_DGRAM, kAddress.sun_path);
   // A handler that interrupted the collector would wait for the collector to read what it logs.
   sigset_t all, earlier;
   sigfillset(&all);
@@ -37,7 +36,7 @@ void LogCatcher::stop() {
   shutdown(socket_, SHUT_RDWR);
   collector_.join();
   close(socket_);
-  unlink(kSocketPath);
+  unlink(kAddress.sun_path);
   socket_ = -1;
 }
 
@@ -52,51 +51,45 @@ void LogCatcher::collect() {
     ASSERT_EQ('\0', record[size - 1]);
     const char* tag = record + kHeaderSize + 1;
     std::lock_guard<std::mutex> lock(mutex_);
-    lines_.push_back({record[0], record[kHeaderSize], tag, tag + strlen(tag) + 1});
+    texts_.emplace_back(tag + strlen(tag) + 1);
   }
 }
 
 // The socket keeps the order: what was sent before this mark has been collected after it.
 void LogCatcher::catch_up() {
   caught_up_ = false;
-  int fd = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
-  struct sockaddr_un address = {AF_UNIX, ""};
-  strcpy(address.sun_path, kSocketPath);
-  EXPECT_EQ(1, sendto(fd, "", 1, 0, reinterpret_cast<sockaddr*>(&address), sizeof address));
-  close(fd);
+  EXPECT_EQ(1, sendto(socket_, "", 1, 0, reinterpret_cast<const struct sockaddr*>(&kAddress),
+                      sizeof kAddress));
   while (!caught_up_) usleep(100);
 }
 
-std::vector<LogLine> LogCatcher::lines() {
+Texts LogCatcher::texts(const Texts& ignored) {
   catch_up();
   std::lock_guard<std::mutex> lock(mutex_);
-  return lines_;
-}
-
-std::vector<std::string> LogCatcher::texts() {
-  std::vector<std::string> texts;
-  for (const LogLine& line : lines()) texts.push_back(line.text);
-  return texts;
+  Texts kept;
+  std::copy_if(texts_.begin(), texts_.end(), std::back_inserter(kept), [&](const auto& text) {
+    return std::none_of(ignored.begin(), ignored.end(),
+                        [&](const auto& part) { return holds(text, part); });
+  });
+  return kept;
 }
 
 bool LogCatcher::has(const std::string& text) {
   return eventually([&] {
-    std::vector<std::string> all = texts();
+    Texts all = texts();
     return std::find(all.begin(), all.end(), text) != all.end();
   });
 }
 
 size_t LogCatcher::count(const std::string& part) {
-  std::vector<std::string> all = texts();
-  return std::count_if(all.begin(), all.end(), [&](const std::string& text) {
-    return text.find(part) != std::string::npos;
-  });
+  Texts all = texts();
+  return std::count_if(all.begin(), all.end(), [&](const auto& text) { return holds(text, part); });
 }
 
 void LogCatcher::clear() {
   catch_up();
   std::lock_guard<std::mutex> lock(mutex_);
-  lines_.clear();
+  texts_.clear();
 }
 
 }  // namespace corvexd::test

@@ -5,16 +5,10 @@
 #include <mutex>
 #include <string>
 #include <thread>
-#include <vector>
+
+#include "tests/files.h"
 
 namespace corvexd::test {
-
-struct LogLine {
-  int buffer;
-  int priority;
-  std::string tag;
-  std::string text;
-};
 
 class LogCatcher {
  public:
@@ -22,8 +16,8 @@ class LogCatcher {
   void start();  // binds the log daemon's socket
   void stop();
 
-  std::vector<LogLine> lines();           // every line sent before the call
-  std::vector<std::string> texts();       // in the order of arrival
+  // Every line sent before the call, in the order of arrival, but those that hold a part ignored.
+  Texts texts(const Texts& ignored = {});
   bool has(const std::string& text);      // exactly this line, waited for
   size_t count(const std::string& part);  // lines that hold `part`
   void clear();
@@ -35,7 +29,7 @@ class LogCatcher {
   int socket_ = -1;
   std::thread collector_;
   std::mutex mutex_;
-  std::vector<LogLine> lines_;
+  Texts texts_;
   std::atomic<bool> caught_up_{false};
 };
 

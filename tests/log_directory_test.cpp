@@ -2,18 +2,11 @@
 
 #include <fnmatch.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
-#include <sys/wait.h>
-#include <unistd.h>
-
-#include <algorithm>
 
 #include "core/state.h"
 #include "storage/capture_paths.h"
 #include "storage/mkdirs.h"
-#include "tests/daemon.h"
 #include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
@@ -21,20 +14,10 @@ namespace {
 class LogDirectory : public DeviceTest {
  protected:
   LogDirectory() {
-    umask(077);
     checkLogPath();
     log.clear();
   }
 };
-
-// The status of a child that makes a log directory.
-int status_of_creation() {
-  pid_t child = fork();
-  if (child == 0) _exit(createLogDirectory() == 0 ? 0 : 3);
-  int status = -1;
-  waitpid(child, &status, 0);
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-}
 
 TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
   set_property("ro.build.ota.versionname", "A.B.C");
@@ -46,7 +29,7 @@ TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
       "/data/corvex/KVBR_1--20[0-9][0-9]-[01][0-9]-[0-3][0-9]-[0-2][0-9]-"
       "[0-5][0-9]-[0-6][0-9]_current";
   EXPECT_EQ(0, fnmatch(pattern, first.c_str(), 0)) << first;
-  EXPECT_EQ((std::vector<std::string>{"boot_log", "fileAfter911", "versionNumber"}), list(first));
+  EXPECT_EQ((Texts{"boot_log", "fileAfter911", "versionNumber"}), list(first));
   EXPECT_EQ("A.B.C" + std::string(87, '\0'), read_file(first + "/versionNumber"));
   EXPECT_EQ("after", read_file(first + "/fileAfter911"));
   EXPECT_EQ(0600u, mode_of(first + "/versionNumber"));
@@ -54,24 +37,15 @@ TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
     EXPECT_EQ(0755u, mode_of(path)) << path;
     EXPECT_EQ(owners_work(), is_systems(path)) << path;
   }
-  const std::vector<std::string> expected = {
-      "corvexd: pdir is null! \n",
-      "corvexd: log dir is " + first + " \n",
-      "corvexd: Log Directory created successfully, path is /data/corvex \n",
-      "corvexd: Log Directory created successfully, path is " + first + " \n",
-      "corvexd: vn is " + first + "/versionNumber \n",
-      "corvexd: copy_file /cache/fileAfter911 '" + first + "/fileAfter911'",
-      "corvexd: copy_file '" + first + "/fileAfter911'",
-      "corvexd: Log Directory created successfully, path is " + first + "/boot_log \n"};
-  EXPECT_TRUE(log.has(expected.back()));
-  std::vector<std::string> texts = log.texts();
-  texts.erase(std::remove_if(texts.begin(), texts.end(),
-                             [](const std::string& text) {
-                               return text.find("fail to chown") !=
-                                      std::string::npos;  // without root
-                             }),
-              texts.end());
-  EXPECT_EQ(expected, texts);
+  const std::string made = "corvexd: Log Directory created successfully, path is ";
+  EXPECT_EQ(
+      (Texts{"corvexd: pdir is null! \n", "corvexd: log dir is " + first + " \n",
+             made + "/data/corvex \n", made + first + " \n",
+             "corvexd: vn is " + first + "/versionNumber \n",
+             "corvexd: copy_file /cache/fileAfter911 '" + first + "/fileAfter911'",
+             "corvexd: copy_file '" + first + "/fileAfter911'", made + first + "/boot_log \n"}),
+      log.texts({"fail to chown"}))
+      << "but what is said without root";
 
   makeLogAbsolutePath();
   EXPECT_EQ(first + "/tcpdump", tcpdump_path.get().c_str());
@@ -87,22 +61,18 @@ TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
 
 TEST_F(LogDirectory, EveryDirectoryLosesTheMark) {
   const std::string unfit = std::string(200, 'u') + "_current";
-  for (const std::string& name :
-       {std::string("a_current"), std::string("-b \n_current"), std::string("c_currentABCD"),
-        std::string("d_current"), std::string("other"), unfit}) {
-    ASSERT_EQ(0, mkdir(("/data/corvex/" + name).c_str(), 0755));
-  }
-  run("mkdir -p /data/corvex/d/full");
-  write_file("/data/corvex/file_current", "");
+  run("cd /data/corvex && mkdir -p a_current './-b \n_current' c_currentABCD d_current d/full "
+      "other " +
+      unfit + " && touch file_current");
   renameLastDirectoryName();
-  EXPECT_EQ((std::vector<std::string>{"-b \n", "a", "c_cur", "d", "d_current", "file_current",
-                                      "other", unfit}),
+  EXPECT_EQ((Texts{"-b \n", "a", "c_cur", "d", "d_current", "file_current", "other", unfit}),
             list("/data/corvex"));
-  EXPECT_TRUE(log.has("corvexd: DIR NAME : other \n"));
-  EXPECT_TRUE(log.has("corvexd: NEW IS /data/corvex/a \n"));
-  EXPECT_TRUE(log.has("corvexd: OLD IS /data/corvex/a_current \n"));
-  EXPECT_TRUE(log.has("corvexd: NEW PATH IS /data/corvex/a\n"));
-  EXPECT_TRUE(log.has("corvexd: Rename failed! Error: Directory not empty\n"));
+  for (const char* line :
+       {"corvexd: DIR NAME : other \n", "corvexd: NEW IS /data/corvex/a \n",
+        "corvexd: OLD IS /data/corvex/a_current \n", "corvexd: NEW PATH IS /data/corvex/a\n",
+        "corvexd: Rename failed! Error: Directory not empty\n"}) {
+    EXPECT_TRUE(log.has(line)) << line;
+  }
   EXPECT_EQ(3u, log.count("RENAME SUCCESSFULL!"));
   EXPECT_EQ(1u, log.count("too long"));
   run("rm -r /data/corvex");
@@ -112,14 +82,14 @@ TEST_F(LogDirectory, EveryDirectoryLosesTheMark) {
 
 TEST_F(LogDirectory, TheProcessEndsWhenItCannotBeUsed) {
   run("rmdir /data/corvex && touch /data/corvex");
-  EXPECT_EQ(1, status_of_creation());
+  EXPECT_EQ(1, status_in_child(createLogDirectory));
   EXPECT_EQ(1u, log.count("corvexd: Directory create failed! Error: Not a directory\n"));
   EXPECT_EQ(1u, log.count("/versionNumber Error：Not a directory\n"));
 
   run("rm /data/corvex && mkdir /data/corvex");
   ASSERT_EQ(0, mount("full", "/data/corvex", "tmpfs", 0, "nr_blocks=1"));
   write_file("/data/corvex/filler", std::string(4096, 'f'));
-  EXPECT_EQ(1, status_of_creation());
+  EXPECT_EQ(1, status_in_child(createLogDirectory));
   EXPECT_TRUE(
       log.has("corvexd: bytes_write is -1, versionNumber is existing now! Error: No space "
               "left on device \n"));
@@ -131,7 +101,7 @@ TEST_F(LogDirectory, MkdirsMakesWhatIsMissing) {
   EXPECT_EQ(0, mkdirs("/data/one/two/three"));
   EXPECT_EQ(0, mkdirs("/data/one/four/"));
   EXPECT_EQ(0, mkdirs("/data/one/two/three"));
-  EXPECT_EQ((std::vector<std::string>{"four", "two"}), list("/data/one"));
+  EXPECT_EQ((Texts{"four", "two"}), list("/data/one"));
   EXPECT_EQ(4u, log.count("created successfully"));
   write_file("/data/one/file", "");
   EXPECT_EQ(-1, mkdirs("/data/one/file/below"));

@@ -1,12 +1,9 @@
 #include "tests/property_service.h"
 
-#include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
@@ -21,9 +18,8 @@ std::string receive_text(int client) {
 
 }  // namespace
 
-PropertyService::PropertyService() : socket_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-  const struct sockaddr_un address = {AF_UNIX, "/dev/socket/property_service"};
-  EXPECT_EQ(0, bind(socket_, reinterpret_cast<const sockaddr*>(&address), sizeof address));
+PropertyService::PropertyService()
+    : socket_(bound_socket(SOCK_STREAM, "/dev/socket/property_service")) {
   listen(socket_, 8);
   server_ = std::thread([this] { serve(); });
 }
@@ -36,16 +32,18 @@ PropertyService::~PropertyService() {
 
 void PropertyService::serve() {
   for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
-    uint32_t command = 0, done = 0;
+    uint32_t command = 0;
     recv(client, &command, sizeof command, MSG_WAITALL);
+    EXPECT_EQ(0x00020001u, command);
     std::string key = receive_text(client);
     std::string value = receive_text(client);
-    if (key.rfind("ctl.", 0) != 0) set_property(key, value);
+    const uint32_t result = key.rfind("ro.", 0) == 0 ? 24 : 0;
+    if (result == 0 && key.rfind("ctl.", 0) != 0) set_property(key, value);
     {
       std::lock_guard<std::mutex> lock(mutex_);
       requests_.emplace_back(key, value);
     }
-    send(client, &done, sizeof done, MSG_NOSIGNAL);
+    send(client, &result, sizeof result, MSG_NOSIGNAL);
     close(client);
   }
 }

@@ -9,7 +9,7 @@
 
 namespace corvexd::test {
 
-// Stores what is set, and keeps the list; "ctl." requests are only listed.
+// Stores what is set, and keeps the list; "ctl." requests are only listed, "ro." refused.
 class PropertyService {
  public:
   PropertyService();

@@ -1,5 +1,4 @@
 // Stands in for logcat and tcpdump: reports what it was given, then lives as /probe/mode says.
-#include <dirent.h>
 #include <fcntl.h>
 #include <signal.h>
 #include <stdio.h>
@@ -7,30 +6,10 @@
 #include <time.h>
 #include <unistd.h>
 
-namespace {
-
-void report_signals(FILE* report) {
-  char line[256];
-  FILE* status = fopen("/proc/self/status", "re");
-  while (fgets(line, sizeof line, status) != nullptr) {
-    if (strncmp(line, "SigBlk", 6) == 0 || strncmp(line, "SigIgn", 6) == 0) fputs(line, report);
-  }
-  fclose(status);
-}
-
-// Every descriptor that was open at the exec, but the standard three.
-void report_descriptors(FILE* report, const bool* inherited) {
-  for (int fd = 3; fd < 64; ++fd) {
-    if (inherited[fd]) fprintf(report, "fd %d\n", fd);
-  }
-}
-
-}  // namespace
-
 int main(int argc, char** argv) {
   struct timespec started;
   clock_gettime(CLOCK_MONOTONIC, &started);
-  bool inherited[64];
+  bool inherited[64];  // was open at the exec
   for (int fd = 0; fd < 64; ++fd) inherited[fd] = fcntl(fd, F_GETFD) != -1;
   char mode[16] = "live";
   if (FILE* file = fopen("/probe/mode", "re")) {
@@ -45,8 +24,14 @@ int main(int argc, char** argv) {
   FILE* report = fopen(draft, "we");
   if (report == nullptr) return 2;
   for (int i = 0; i < argc; ++i) fprintf(report, "arg %s\n", argv[i]);
-  report_signals(report);
-  report_descriptors(report, inherited);
+  char line[256];
+  FILE* status = fopen("/proc/self/status", "re");
+  while (fgets(line, sizeof line, status) != nullptr) {
+    if (strncmp(line, "SigBlk", 6) == 0 || strncmp(line, "SigIgn", 6) == 0) fputs(line, report);
+  }
+  for (int fd = 3; fd < 64; ++fd) {
+    if (inherited[fd]) fprintf(report, "fd %d\n", fd);
+  }
   fprintf(report, "started %lld\n", started.tv_sec * 1'000'000'000LL + started.tv_nsec);
   fclose(report);
   rename(draft, path);

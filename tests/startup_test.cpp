@@ -1,62 +1,24 @@
 // From the start of the process to the first connection, seen from outside.
-#include <signal.h>
-#include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
 
 #include "early/initial_log.h"
 #include "tests/daemon.h"
-#include "tests/device_root.h"
-#include "tests/files.h"
 #include "tests/property_service.h"
 
 namespace corvexd::test {
 namespace {
 
-using Texts = std::vector<std::string>;
-
 class Startup : public DeviceTest {
  protected:
-  Startup() {
-    install_probes("live");
-    umask(077);
-  }
-
-  // The lines of the main thread; the children's and the other threads' come in between.
-  Texts own_lines() {
-    Texts lines;
-    for (const std::string& text : log.texts()) {
-      bool foreign = text.find("_boot_pid") != std::string::npos ||
-                     text.find("executeOnBootLogcat a") != std::string::npos ||
-                     text.find("executeOnBootLogcat k") != std::string::npos ||
-                     text.find("executeOnBootLogcat event") != std::string::npos ||
-                     text.find("delete_file") != std::string::npos ||
-                     text.find("fail to chown") != std::string::npos ||
-                     text.find("Failed to read") == 0;  // the platform's own
-      if (!foreign) lines.push_back(text);
-    }
-    return lines;
-  }
-
-  static bool listens() {
-    int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    const struct sockaddr_un address = {AF_UNIX, "/dev/socket/corvexd"};
-    bool connected = connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
-    close(fd);
-    return connected;
-  }
-
   PropertyService service;
 };
 
-Texts arguments_of(const std::vector<ProbeReport>& reports, const std::string& file) {
-  for (const ProbeReport& report : reports) {
-    if (report.arguments.size() > 2 && report.arguments[2] == file) return report.arguments;
-  }
-  return {};
+bool listens() {
+  int fd = try_to_connect();
+  close(fd);
+  return fd != -1;
 }
 
 TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
@@ -66,8 +28,7 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   const std::string layout_line = "corvexd: installd fs upgrade not yet complete. Waiting...\n";
   const std::string mount_line = "corvexd: Waiting for internal sd be mounted... \n";
   ASSERT_TRUE(log.has(layout_line));
-  std::vector<ProbeReport> boot = probe_reports(4);
-  for (const ProbeReport& report : boot) {
+  for (const ProbeReport& report : probe_reports(4)) {
     EXPECT_EQ(3u, report.rest.size()) << "two lines of signals, the time, no descriptor";
   }
   write_file("/data/.layout_version", "2");
@@ -81,11 +42,25 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   EXPECT_FALSE(listens());
   set_property("ro.mount.tempfs", "true");
   ASSERT_TRUE(eventually(listens));
-  std::vector<ProbeReport> all = probe_reports(7);
+  const std::string boot = "logcat -f /cache/boot_log/";
+  const std::string initial = "logcat -f /cache/log_before_initial/";
+  EXPECT_EQ((Texts{boot + "android_boot.log -r 8192 -n 1 -b system -b main -b crash -v '' '' ''",
+                   boot + "radio_boot.log -r 4096 -n 1 -b radio -v '' '' ''",
+                   boot + "event_boot.log -r 4096 -n 1 -b events -v '' '' ''",
+                   boot + "kernel_boot.log -r 4096 -n 1 -b kernel",
+                   initial + "android_initial.log -r 2048 -n 4 -b system -b main -b crash "
+                             "-v long *:V ''",
+                   initial + "kernel_initial.log -r 1024 -n 4 -b kernel",
+                   initial + "event_initial.log -r 1024 -n 4 -b events"}),
+            command_lines(probe_reports(7)))
+      << "the settings are read between the two phases";
   ASSERT_TRUE(log.has("corvexd: in function main, persist.sys.assert.panic = false\n"));
 
   const std::string made = "corvexd: Log Directory created successfully, path is ";
-  Texts lines = own_lines();
+  // The children's lines and the other threads' come in between; the last is the platform's own.
+  Texts lines =
+      log.texts({"_boot_pid", "executeOnBootLogcat a", "executeOnBootLogcat k",
+                 "executeOnBootLogcat event", "delete_file", "fail to chown", "Failed to read"});
   lines.erase(std::unique(lines.begin(), lines.end()), lines.end());
   lines.resize(std::min<size_t>(lines.size(), 11));
   EXPECT_EQ((Texts{"corvexd main start\n", "put cache logs in /cache/ \n", "corvexd firing up\n",
@@ -94,30 +69,11 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
                    "corvexd LOG_ROOT : /data/corvex\n", made + "/cache/log_before_initial \n",
                    "corvexd: in function main, persist.sys.assert.panic = false\n"}),
             lines);
-  EXPECT_EQ((Texts{"logcat", "-f", "/cache/boot_log/android_boot.log", "-r", "8192", "-n", "1",
-                   "-b", "system", "-b", "main", "-b", "crash", "-v", "", "", ""}),
-            arguments_of(boot, "/cache/boot_log/android_boot.log"))
-      << "the settings are not read yet";
-  EXPECT_EQ((Texts{"logcat", "-f", "/cache/boot_log/radio_boot.log", "-r", "4096", "-n", "1", "-b",
-                   "radio", "-v", "", "", ""}),
-            arguments_of(boot, "/cache/boot_log/radio_boot.log"));
-  EXPECT_EQ((Texts{"logcat", "-f", "/cache/boot_log/kernel_boot.log", "-r", "4096", "-n", "1", "-b",
-                   "kernel"}),
-            arguments_of(boot, "/cache/boot_log/kernel_boot.log"));
-  const std::string initial = "/cache/log_before_initial/";
-  EXPECT_EQ((Texts{"logcat", "-f", initial + "android_initial.log", "-r", "2048", "-n", "4", "-b",
-                   "system", "-b", "main", "-b", "crash", "-v", "long", "*:V", ""}),
-            arguments_of(all, initial + "android_initial.log"));
-  EXPECT_EQ((Texts{"logcat", "-f", initial + "event_initial.log", "-r", "1024", "-n", "4", "-b",
-                   "events"}),
-            arguments_of(all, initial + "event_initial.log"));
   EXPECT_EQ("false", property("oem.after.clear"));
   EXPECT_EQ(0775u, mode_of("/cache/boot_log"));
   EXPECT_EQ(0775u, mode_of("/cache/log_before_initial"));
-  for (const char* line : {"corvexd: android_boot_pid", "corvexd: kernel_boot_pid \n",
-                           "corvexd: executeOnBootLogcat event \n"}) {
-    EXPECT_TRUE(log.has(line));
-  }
+  EXPECT_TRUE(log.has("corvexd: kernel_boot_pid \n"));
+  EXPECT_TRUE(log.has("corvexd: executeOnBootLogcat event \n"));
 }
 
 TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
@@ -138,7 +94,7 @@ TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
   EXPECT_TRUE(eventually(listens));
   EXPECT_EQ(1u, log.count("Waiting for"));
   EXPECT_TRUE(log.has("put cache logs in /kv2/ \n"));
-  EXPECT_EQ(4u, probe_reports(4).size());
+  probe_reports(4);
   EXPECT_FALSE(exists("/kv2/log_before_initial")) << "the marker says that phase is over";
   EXPECT_EQ("", property("oem.after.clear"));
   run("rm -r /kv2");
@@ -147,8 +103,7 @@ TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
 TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   make_device_ready();
   set_property("persist.sys.assert.panic", "true");
-  set_property("persist.sys.qxdm", "yes");
-  set_property("persist.sys.radio", "yes");
+  switch_on({"qxdm", "radio"});
   set_property("persist.sys.radio.logsize", "5");
   write_file("/cache/boot_log_old", "");
   BootingDaemon daemon;
@@ -158,7 +113,8 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
     return std::count(all.begin(), all.end(), wanted) == 1;
   }));
   const std::string directory = current_directory();
-  EXPECT_EQ("5", arguments_of(probe_reports(5), directory + "/radio.log")[4]);
+  EXPECT_EQ("logcat -f " + directory + "/radio.log -r 5 -n 5 -b radio -v threadtime *:V ''",
+            command_lines(probe_reports(5)).back());
   EXPECT_TRUE(log.has("start diag_mdlog_start"));
 
   // The minute ends: the boot recorders with it, and their files come into the capture.
@@ -175,11 +131,8 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   EXPECT_EQ("boot", read_file(directory + "/boot_log/android_boot.log"));
   const std::vector<ProbeReport> recorders = probe_reports(5);
   EXPECT_TRUE(eventually([&] {
-    size_t alive = 0;
-    for (const ProbeReport& report : recorders) {
-      alive += !read_file("/proc/" + std::to_string(report.pid) + "/cmdline").empty();
-    }
-    return alive == 1;
+    return std::count_if(recorders.begin(), recorders.end(),
+                         [](const auto& report) { return has_ended(report.pid); }) == 4;
   })) << "the capture's recorder goes on";
 }
 

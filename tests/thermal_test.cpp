@@ -4,8 +4,6 @@
 #include <sstream>
 
 #include "tests/daemon.h"
-#include "tests/device_root.h"
-#include "tests/files.h"
 
 namespace corvexd::test {
 namespace {
@@ -25,17 +23,13 @@ class Thermal : public DeviceTest {
   }
 };
 
-std::vector<std::string> lines_of(const std::string& directory) {
-  std::vector<std::string> lines;
+Texts lines_of(const std::string& directory) {
+  Texts lines;
   for (const std::string& name : list(directory)) {
     std::istringstream file(read_file(directory + "/" + name));
     for (std::string line; std::getline(file, line);) lines.push_back(line);
   }
   return lines;
-}
-
-bool holds(const std::string& line, const std::string& part) {
-  return line.find(part) != std::string::npos;
 }
 
 TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
@@ -67,7 +61,8 @@ TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
   set_source(zone(3), "7\n");
   EXPECT_TRUE(eventually([&] {
     line = lines_of(directory).back();
-    return holds(line, "tz_sensor0=        , ") && holds(line, "tz_sensor3=7, ");
+    return line.find(", tz_sensor0=        , ") != std::string::npos &&
+           line.find(", tz_sensor3=7, ") != std::string::npos;
   }));
 }
 
