@@ -101,6 +101,8 @@ void dump_input(const LongPath& directory) {
 
 void begin_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
+  // Before the first capture there is no log directory, and nothing is to be made elsewhere.
+  if (*LOG_DIR.get().c_str() == '\0') return;
   LongPath directory;
   {
     std::lock_guard<std::mutex> lock(current_directory_mutex);

@@ -73,6 +73,11 @@ void copy_folder(const char* src_dir, const char* sub) {
   Directory source = open_directory(src_dir);
   if (!source) return;
   Path folder = LOG_DIR.get();
+  // Before the first capture there is no log directory, and nothing is to be made elsewhere.
+  if (*folder.c_str() == '\0') {
+    log_error("corvexd: fail to mkdir");
+    return;
+  }
   if (!folder.append(sub).fits_or_log()) return;
   if (!provide_folder(folder.c_str())) return;
   while (struct dirent* entry = next_entry(source)) {

@@ -13,6 +13,9 @@ namespace {
 constexpr int kWorkingSize = 512;
 constexpr mode_t kMode = 0755;
 
+// What cannot be asked for may still be there to be opened.
+bool exists(const char* path) { return access(path, F_OK) == 0 || open_directory(path); }
+
 bool create(const char* path) {
   if (make_directory(path, kMode) != 0) {
     log_error("corvexd: Directory create failed! Error: %s\n", strerror(errno));
@@ -37,7 +40,7 @@ int mkdirs(const char* path) {
   if (slash != nullptr) slash = strchr(slash + 1, '/');
   for (; slash != nullptr; slash = strchr(slash + 1, '/')) {
     *slash = '\0';
-    if (access(working, F_OK) != 0) {
+    if (!exists(working)) {
       if (!create(working)) return -1;
       if (give_to_system(working) != 0) log_info("corvexd: fail to chown, path is %s \n", working);
     }
