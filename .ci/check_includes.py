@@ -21,7 +21,7 @@ ALLOWED = {
 }
 
 # These look at whatever they try out.
-OUTSIDE = ["tests", "fuzz", "bench"]
+OUTSIDE = ["tests", "fuzz", "bench", "faults"]
 
 # What of core sits on top of the rooms: it may look into each of them, and none of them at it.
 TOP = ["core/main", "core/startup", "core/control_socket", "core/commands"]
