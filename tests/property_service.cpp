@@ -33,7 +33,10 @@ PropertyService::~PropertyService() {
 void PropertyService::serve() {
   for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
     uint32_t command = 0;
-    recv(client, &command, sizeof command, MSG_WAITALL);
+    if (recv(client, &command, sizeof command, MSG_WAITALL) != sizeof command) {
+      close(client);  // its daemon was killed before it had asked
+      continue;
+    }
     EXPECT_EQ(0x00020001u, command);
     std::string key = receive_text(client);
     std::string value = receive_text(client);
