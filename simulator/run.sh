@@ -6,28 +6,12 @@ set -eu
 here=$(cd "$(dirname "$0")" && pwd)
 build=$(cd "${1:?usage: run.sh BUILD_DIR [BOOT_OPTION]...}" && pwd)
 shift
-device=$build/simulator/corvex-device
 root=$build/device
 seconds=10
 patience=30 # seconds; the storage takes less than five to come up
 show="show-$$"
-keeper=
-
-in_device() { "$device" exec "$root" "$@"; }
-
-fail() {
-    echo "run: $*" >&2
-    exit 1
-}
-
-shut_down() {
-    [ -n "$keeper" ] || return 0
-    kill "$keeper" 2>/dev/null || true
-    wait "$keeper" 2>/dev/null || true
-    keeper=
-}
-trap shut_down EXIT
-trap 'exit 130' INT TERM
+# shellcheck source=simulator/boot.sh
+. "$here/boot.sh"
 
 send() {
     echo "$1"
@@ -51,14 +35,7 @@ begin_capture() {
 collect() { in_device setprop persist.sys.assert.panic "$1"; }
 
 echo "booting the device in $root"
-: >"$build/device.out" # what the last one said must not be taken for ours
-"$device" boot "$root" "$@" >>"$build/device.out" 2>"$build/device.err" &
-keeper=$!
-until grep -q "device ready" "$build/device.out"; do
-    kill -0 "$keeper" 2>/dev/null || fail "the device did not start: $(cat "$build/device.err")"
-    sleep 0.1
-done
-grep "^corvex-device" "$build/device.err" || true
+boot "$@"
 echo "the daemon's start, as the log tells of it:"
 in_device timeout $((patience * 2)) bash -s <"$here/show/start.sh" &
 teller=$!

@@ -7,9 +7,9 @@ set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
 build=$(cd "${1:?usage: soak.sh BUILD_DIR [SECONDS]}" && pwd)
 seconds=${2:-300}
-device=$build/simulator/corvex-device
 root=$build/soak-device
-keeper=
+# shellcheck source=simulator/boot.sh
+. "$here/boot.sh"
 
 # Everything is on, and so small that each series rotates.
 properties=(
@@ -21,32 +21,6 @@ properties=(
     persist.sys.{android,radio,event,kernel}.lognum"=3"
     "persist.sys.tcpdump.logsize=1"
 )
-
-in_device() { "$device" exec "$root" "$@"; }
-
-fail() {
-    echo "soak: $*" >&2
-    exit 1
-}
-
-boot() {
-    : >"$build/soak.out" # what the last one said must not be taken for ours
-    "$device" boot "$root" >>"$build/soak.out" 2>"$build/soak.err" &
-    keeper=$!
-    until grep -q "device ready" "$build/soak.out"; do
-        kill -0 "$keeper" 2>/dev/null || fail "the device did not start: $(cat "$build/soak.err")"
-        sleep 0.1
-    done
-}
-
-shut_down() {
-    [ -n "$keeper" ] || return 0
-    kill "$keeper" 2>/dev/null || true
-    wait "$keeper" 2>/dev/null || true
-    keeper=
-}
-trap shut_down EXIT
-trap 'exit 130' INT TERM
 
 # An ordinary user's device has files of further users, on whose behalf a user namespace can act.
 remove_root() {
@@ -72,10 +46,10 @@ watch_log() {
 if in_device true 2>/dev/null; then fail "a device runs on $root already"; fi
 remove_root
 # Once for the properties: the second start finds them as a phone's would.
-boot
+boot --quiet
 for property in "${properties[@]}"; do in_device setprop "${property%=*}" "${property#*=}"; done
 shut_down
-boot
+boot --quiet
 watch_log >"$build/soak.unknown" &
 watcher=$!
 in_device bash -s soak 1000000 <"$here/show/input.sh" >/dev/null &
@@ -92,6 +66,6 @@ fi
 if [ "$status" = 0 ]; then
     echo "nothing leaked, nothing unexpected"
 else
-    echo "what the device's programs said besides: $build/soak.err"
+    echo "what the device's programs said besides: $root.err"
 fi
 exit "$status"
