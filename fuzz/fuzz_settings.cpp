@@ -36,16 +36,7 @@ std::string take_value(const uint8_t** data, size_t* size) {
   return value;
 }
 
-}  // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  std::string values[std::size(kSettings)];
-  for (size_t i = 0; i < std::size(kSettings); ++i) {
-    values[i] = take_value(&data, &size);
-    corvexd::test::set_property(kSettings[i].property, values[i]);
-  }
-  corvexd::test::set_property("persist.sys.corvex.path", take_value(&data, &size));
-  corvexd::loadSettings();
+void check(const std::string* values) {
   for (size_t i = 0; i < std::size(kSettings); ++i) {
     const size_t length = strnlen(kSettings[i].text, kSettings[i].size);
     if (length == kSettings[i].size) __builtin_trap();
@@ -60,5 +51,21 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const corvexd::LogcatVector vector = corvexd::logcat_vector(job, "file");
   const char* const* end = std::end(vector.arguments);
   if (std::find(std::begin(vector.arguments), end, nullptr) == end) __builtin_trap();
+}
+
+}  // namespace
+
+// Each property's value is another one than at the last time.
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  do {
+    std::string values[std::size(kSettings)];
+    for (size_t i = 0; i < std::size(kSettings); ++i) {
+      values[i] = take_value(&data, &size);
+      corvexd::test::set_property(kSettings[i].property, values[i]);
+    }
+    corvexd::test::set_property("persist.sys.corvex.path", take_value(&data, &size));
+    corvexd::loadSettings();
+    check(values);
+  } while (size != 0);
   return 0;
 }

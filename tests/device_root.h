@@ -11,8 +11,8 @@
 namespace corvexd::test {
 
 // Moves the calling process into new mount and pid namespaces (without root, a user namespace too)
-// and a fresh device root on a tmpfs, with the host's /usr and the build folder at /build, both
-// read-only. Returns in a child whose exit status the first process ends with.
+// and a fresh device root on a tmpfs, with the host's /usr and the build folder at /build. Returns
+// in a child whose exit status the first process ends with.
 void enter_device_root();
 
 // Makes the device in that root an empty one: its directories, no property set.
