@@ -10,7 +10,7 @@
 #include <unistd.h>
 
 #include "core/pause.h"
-#include "faults/life.h"
+#include "faults/traced_daemon.h"
 
 namespace {
 
@@ -31,7 +31,7 @@ namespace corvexd {
 // A hundredth of every pause; a minute is longer than a traced start and shorter than a life.
 void pause_seconds(time_t seconds) {
   long milliseconds = seconds < 60 ? seconds * 10 : seconds * 18;
-  struct timespec left = {0, milliseconds * 1'000'000};
+  struct timespec left = {milliseconds / 1000, milliseconds % 1000 * 1'000'000};
   while (nanosleep(&left, &left) != 0 && errno == EINTR) {
   }
 }

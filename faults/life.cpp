@@ -1,25 +1,19 @@
 #include "faults/life.h"
 
-#include <dirent.h>
+#include <errno.h>
 #include <fcntl.h>
-#include <signal.h>
 #include <stdlib.h>
-#include <string.h>
 #include <sys/mount.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/syscall.h>
 #include <sys/un.h>
-#include <sys/wait.h>
 #include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <fstream>
-#include <map>
-#include <memory>
 #include <set>
 
+#include "faults/outside.h"
+#include "faults/places.h"
 #include "tests/daemon.h"
 #include "tests/device_root.h"
 #include "tests/files.h"
@@ -31,14 +25,6 @@ namespace {
 
 using namespace test;  // NOLINT(google-build-using-namespace): the device and its helpers
 
-constexpr char kProgram[] = "/build/faults/corvexd_gated";
-// The daemon's root is the device's once more, but with firmware nodes in its /proc. The tracer,
-// which needs the true one, sees the daemon's files below this.
-constexpr char kJail[] = "/jail";
-constexpr char kTracer[] = "/usr/bin/strace";
-constexpr char kTraces[] = "/trace";
-constexpr char kPartition[] = "/dev/block/platform/soc/624000.ufshc/by-name/reserve1";
-constexpr int kPatience = 15;  // seconds, for what takes milliseconds
 constexpr long kMillisecond = 1'000'000;
 constexpr long kWindow = 40 * kMillisecond;  // in which the daemon is watched for being busy
 constexpr int kBusyPercent = 30;
@@ -90,90 +76,6 @@ done
 chmod 755 /system/bin/* /system/xbin/* /vendor/bin/*
 )sh";
 
-long now() {
-  struct timespec time;
-  clock_gettime(CLOCK_MONOTONIC, &time);
-  return time.tv_sec * 1000 * kMillisecond + time.tv_nsec;
-}
-
-// Asks until it is so, or patience ends.
-template <typename Done>
-bool wait_until(const Done& done) {
-  const long end = now() + kPatience * 1000 * kMillisecond;
-  while (!done()) {
-    if (now() > end) return false;
-    usleep(1000);
-  }
-  return true;
-}
-
-// A file of /proc, whose process may end at any moment.
-std::string read_facts(const std::string& path) {
-  char text[4096];
-  int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
-  ssize_t size = fd == -1 ? -1 : read(fd, text, sizeof text);
-  if (fd != -1) close(fd);
-  return {text, static_cast<size_t>(std::max<ssize_t>(size, 0))};
-}
-
-bool ends_with(const std::string& text, const std::string& end) {
-  return text.size() >= end.size() && text.compare(text.size() - end.size(), end.size(), end) == 0;
-}
-
-// What stands outside the places that the daemon writes to: each path with all there is to it.
-using Outside = std::map<std::string, std::string>;
-
-bool is_ours_or_the_daemons(const std::string& path) {
-  static const std::set<std::string> paths = {"/usr",
-                                              "/build",
-                                              "/proc",
-                                              "/daemon_proc",
-                                              "/real_proc",
-                                              kJail,
-                                              "/trace",
-                                              "/probe",
-                                              "/nodes",
-                                              "/dev/socket",
-                                              "/data/corvex",
-                                              "/storage/emulated/0/corvex",
-                                              "/dev/__properties__",
-                                              "/cache/boot_log",
-                                              "/cache/log_before_initial",
-                                              kPartition};
-  return paths.count(path) != 0;
-}
-
-void look_at(const std::string& path, Outside& outside) {
-  // What sets properties leaves a draft behind when the daemon ends in the middle of a request.
-  if (is_ours_or_the_daemons(path) || path.rfind("/dev/draft.", 0) == 0) return;
-  struct stat status;
-  if (lstat(path.c_str(), &status) != 0) return;
-  std::string facts = "mode " + std::to_string(status.st_mode) + " owner " +
-                      std::to_string(status.st_uid) + ":" + std::to_string(status.st_gid);
-  if (S_ISREG(status.st_mode)) facts += " content " + read_file(path);
-  outside[path] = facts;
-  if (!S_ISDIR(status.st_mode)) return;
-  for (const std::string& name : list(path)) {
-    look_at((path == "/" ? "" : path) + "/" + name, outside);
-  }
-}
-
-void compare(const Outside& before, const Outside& after, std::vector<std::string>& problems) {
-  for (const auto& [path, facts] : before) {
-    auto found = after.find(path);
-    if (found == after.end()) {
-      problems.push_back("removed: " + path);
-    } else if (found->second != facts) {
-      problems.push_back("changed: " + path);
-    }
-  }
-  for (const auto& [path, facts] : after) {
-    if (before.count(path) != 0) continue;
-    problems.push_back("made: " + path);
-    run("rm -rf '" + path + "'");  // for the next life
-  }
-}
-
 bool may_be_set(const std::string& key, const std::string& value) {
   static const std::set<std::pair<std::string, std::string>> rows = {
       {"persist.oem.nfc.debug", "1"}, {"oem.after.clear", "false"},
@@ -191,141 +93,6 @@ bool partition_is_sound() {
   return content.size() == 40960 && zeros <= 32768 && zeros % 1024 == 0 &&
          content.find_first_not_of('r', zeros) == std::string::npos;
 }
-
-std::vector<std::string> words(const std::string& text, char separator) {
-  std::vector<std::string> parts;
-  size_t start = 0;
-  for (size_t end; (end = text.find(separator, start)) != std::string::npos; start = end + 1) {
-    parts.push_back(text.substr(start, end - start));
-  }
-  parts.push_back(text.substr(start));
-  return parts;
-}
-
-pid_t start_program(const std::vector<std::string>& arguments) {
-  pid_t pid = fork();
-  if (pid != 0) return pid;
-  int null = open("/dev/null", O_RDWR | O_CLOEXEC);
-  for (int fd : {0, 1, 2}) dup2(null, fd);
-  std::vector<char*> vector;
-  for (const std::string& text : arguments) vector.push_back(const_cast<char*>(text.c_str()));
-  vector.push_back(nullptr);
-  execv(vector[0], vector.data());
-  _exit(127);
-}
-
-// The daemon at its gate, started as init does it, and in a session by which all its descendants
-// are found.
-class TracedDaemon {
- public:
-  TracedDaemon(const Fault* fault, const std::string& traced) {
-    const struct sockaddr_un address = {AF_UNIX, "/dev/socket/corvexd"};
-    int fd = socket(AF_UNIX, SOCK_STREAM, 0);
-    (void)bind(fd, reinterpret_cast<const struct sockaddr*>(&address), sizeof address);
-    setenv("ANDROID_SOCKET_corvexd", std::to_string(fd).c_str(), 1);
-    if (fault != nullptr) setenv(kShieldVariable, std::to_string(fault->number).c_str(), 1);
-    pid_ = fork();
-    if (pid_ == 0) run(fd);
-    unsetenv(kShieldVariable);
-    close(fd);
-    int status;
-    waitpid(pid_, &status, WUNTRACED);
-    attach(fault, traced);
-    kill(pid_, SIGCONT);
-  }
-
-  ~TracedDaemon() {
-    let_go();
-    // Whoever is forked meanwhile is found the next time round.
-    while (kill_session()) usleep(1000);
-    if (!ended_) waitpid(pid_, nullptr, 0);
-  }
-
-  TracedDaemon(const TracedDaemon&) = delete;
-  TracedDaemon& operator=(const TracedDaemon&) = delete;
-
-  pid_t pid() const { return pid_; }
-
-  bool has_ended() {
-    if (!ended_ && waitpid(pid_, &status_, WNOHANG) == pid_) ended_ = true;
-    return ended_;
-  }
-
-  // As a shell shows it.
-  int status() const { return WIFEXITED(status_) ? WEXITSTATUS(status_) : 128 + WTERMSIG(status_); }
-
-  // Takes the tracer away; the daemon goes on.
-  void let_go() {
-    if (tracer_ <= 0) return;
-    kill(tracer_, SIGINT);
-    if (!wait_until([&] { return waitpid(tracer_, nullptr, WNOHANG) == tracer_; })) {
-      kill(tracer_, SIGKILL);
-      waitpid(tracer_, nullptr, 0);
-    }
-    tracer_ = 0;
-  }
-
- private:
-  [[noreturn]] static void run(int fd) {
-    setsid();
-    if (chroot(kJail) != 0 || chdir("/") != 0) _exit(126);
-    int null = open("/dev/null", O_RDWR | O_CLOEXEC);
-    for (int standard : {0, 1, 2}) dup2(null, standard);
-    close_range(3, fd - 1, 0);
-    close_range(fd + 1, ~0u, 0);
-    setenv("PATH", "/system/bin:/bin", 1);
-    execl(kProgram, kProgram, nullptr);
-    _exit(127);
-  }
-
-  void attach(const Fault* fault, const std::string& traced) {
-    // Programs that the daemon executes are let go of; they are not tried out here.
-    std::vector<std::string> arguments = {kTracer, "-ff",
-                                          "-y",    "-k",
-                                          "-b",    "execve",
-                                          "-e",    "signal=none",
-                                          "-o",    std::string(kTraces) + "/t",
-                                          "-p",    std::to_string(pid_)};
-    if (fault == nullptr) {
-      arguments.insert(arguments.end(), {"-e", "trace=" + traced});
-    } else {
-      int when = fault->when + (fault->in_main ? kShieldCalls : 0);
-      std::string lasting;
-      if (fault->lasting) lasting = fault->in_main ? "+" : ".." + std::to_string(kShieldCalls);
-      arguments.insert(arguments.end(), {"-e", "trace=" + fault->call, "-e",
-                                         "inject=" + fault->call + ":" + fault->outcome +
-                                             ":when=" + std::to_string(when) + lasting});
-      // Unwinding each call's stack takes a while; only what fails is of interest.
-      if (fault->outcome.rfind("error=", 0) == 0) {
-        arguments.insert(arguments.end(), {"-e", "status=failed"});
-      }
-    }
-    tracer_ = start_program(arguments);
-    const std::string status = "/proc/" + std::to_string(pid_) + "/status";
-    wait_until([&] { return read_facts(status).find("TracerPid:\t0") == std::string::npos; });
-    usleep(3000);
-  }
-
-  bool kill_session() const {
-    bool any = false;
-    for (const std::string& name : list("/proc")) {
-      pid_t pid = atoi(name.c_str());
-      if (pid <= 0) continue;
-      const std::string status = read_facts("/proc/" + name + "/stat");
-      size_t end = status.rfind(") ");
-      if (end == std::string::npos || status[end + 2] == 'Z') continue;
-      // Behind the name: state, parent, group, session.
-      if (atoi(words(status.substr(end + 2), ' ')[3].c_str()) != pid_) continue;
-      kill(pid, SIGKILL);
-      any = true;
-    }
-    return any;
-  }
-
-  pid_t pid_ = 0, tracer_ = 0;
-  bool ended_ = false;
-  int status_ = 0;
-};
 
 // The client: never waits for ever.
 class Client {
@@ -379,6 +146,12 @@ class Client {
   bool gave_up_ = false;
 };
 
+long now() {
+  struct timespec time;
+  clock_gettime(CLOCK_MONOTONIC, &time);
+  return time.tv_sec * 1000 * kMillisecond + time.tv_nsec;
+}
+
 // Nanoseconds of processor time of the daemon and the children that run its code.
 long processor_time() {
   long total = 0;
@@ -395,7 +168,7 @@ long processor_time() {
   return total;
 }
 
-// Waits until the daemon has nothing more to do.
+// Waits until the daemon has nothing more to do. The tracer alone can make a sampler look busy.
 bool settle() {
   return wait_until([] {
     long before = processor_time(), start = now();
@@ -426,9 +199,9 @@ class Story {
       client_.send(command);
     }
     for (int end : ends) write(end, block.data(), block.size());
-    wait_for_copies();
+    settle();
     for (const char* command : {"LOGSTOP", "DELETELOG"}) client_.send(command);
-    wait_for_copies();
+    settle();
     daemon_.let_go();
     if (!daemon_.has_ended()) serve_still();
     for (int end : ends) close(end);
@@ -451,12 +224,6 @@ class Story {
     look_at("/data/system/dropbox/entry", outside);
   }
 
-  void wait_for_copies() {
-    if (!daemon_.has_ended() && !settle() && !daemon_.has_ended()) {
-      life_.problems.emplace_back("is busy without end");
-    }
-  }
-
   // Untraced and undisturbed, commands are carried out.
   void serve_still() {
     client_.begin_anew();
@@ -477,64 +244,6 @@ class Story {
   TracedDaemon daemon_;
   Client client_;
 };
-
-std::string between(const std::string& text, char first, char last) {
-  size_t start = text.find(first);
-  size_t end = text.find(last, start + 1);
-  return start == std::string::npos || end == std::string::npos
-             ? ""
-             : text.substr(start + 1, end - start - 1);
-}
-
-std::string path_of(const std::string& name, const std::string& line) {
-  static const std::set<std::string> on_descriptors = {"read", "write", "fchown", "fchmod"};
-  std::string folder = between(line, '<', '>');
-  if (folder.rfind(kJail, 0) == 0) folder.erase(0, strlen(kJail));
-  if (on_descriptors.count(name) != 0) return folder;
-  const std::string path = between(line, '"', '"');
-  bool is_relative = !path.empty() && path[0] != '/';
-  return is_relative ? folder + "/" + path : path;
-}
-
-Call read_call(const std::string& line) {
-  Call call;
-  call.name = line.substr(0, line.find('('));
-  call.injected = ends_with(line, "(INJECTED)");
-  call.path = path_of(call.name, line);
-  size_t result = line.rfind(" = -1 E");
-  if (result != std::string::npos) call.error = between(line.substr(result), '(', ')');
-  return call;
-}
-
-// A line for each call, and below it one for each caller.
-void read_trace(const std::string& file, bool in_main, bool injected_only, Life& life) {
-  std::ifstream lines(file);
-  std::map<std::string, int> counts;
-  bool wanted = false;
-  for (std::string line; std::getline(lines, line);) {
-    if (line.rfind(" > ", 0) != 0) {
-      wanted = line.find('(') != std::string::npos && line.rfind("+++", 0) != 0 &&
-               (!injected_only || ends_with(line, "(INJECTED)"));
-      if (!wanted) continue;
-      life.calls.push_back(read_call(line));
-      life.calls.back().in_main = in_main;
-      life.calls.back().when = ++counts[life.calls.back().name];
-    } else if (wanted && line.find(kProgram) != std::string::npos) {
-      life.calls.back().functions.push_back(between(line, '(', '+'));
-      life.calls.back().site += between(line, '[', ']') + " ";
-    }
-  }
-  // The shield's calls are nobody's.
-  life.calls.erase(std::remove_if(life.calls.begin(), life.calls.end(),
-                                  [](const Call& call) {
-                                    return std::any_of(call.functions.begin(), call.functions.end(),
-                                                       [](const std::string& function) {
-                                                         return function.find("wait_at_gate") !=
-                                                                std::string::npos;
-                                                       });
-                                  }),
-                   life.calls.end());
-}
 
 }  // namespace
 
@@ -571,7 +280,7 @@ Life live(const Fault* fault, const std::string& traced) {
     story.tell(before);
     for (const std::string& name : list(kTraces)) {
       const std::string file = std::string(kTraces) + "/" + name;
-      read_trace(file, file == main_trace, fault != nullptr, life);
+      read_trace(file, file == main_trace, fault != nullptr, life.calls);
     }
   }
   look_at("/", after);
@@ -584,11 +293,6 @@ Life live(const Fault* fault, const std::string& traced) {
   if (!partition_is_sound()) life.problems.emplace_back("the partition is neither log nor zeros");
   life.log = log.texts();
   return life;
-}
-
-std::string describe(const Fault& fault) {
-  return fault.call + ":" + fault.outcome + ":when=" + std::to_string(fault.when) +
-         (fault.lasting ? "+" : "") + (fault.in_main ? " of the main thread" : " of the others");
 }
 
 }  // namespace corvexd::faults
