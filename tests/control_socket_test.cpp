@@ -1,3 +1,4 @@
+#include <poll.h>
 #include <signal.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -64,6 +65,39 @@ TEST_F(ControlSocket, DeletelogAnswersAndSurvivesAClientThatHasGone) {
   run("rm -r /data/corvex && mkdir -p /storage/emulated/0/corvex/x");
   EXPECT_EQ("CLEANFAILED", send_commands({"DELETELOG"}));
   EXPECT_TRUE(exists("/storage/emulated/0/corvex/x")) << "the second root waits for the first";
+}
+
+TEST_F(ControlSocket, AnIllBehavedClientCostsItsOwnConnection) {
+  run("mkdir -p /storage/emulated/0/corvex");
+  Daemon daemon(log);
+  const std::string descriptors = "/proc/" + std::to_string(daemon.pid()) + "/fd";
+  send_commands({"CHANGEPATH"});
+  const size_t idle = list(descriptors).size();
+
+  // Silent ones, as many as the queue takes beside the one that is served.
+  std::vector<int> clients;
+  for (int i = 0; i < 6; ++i) clients.push_back(connect_to_daemon());
+  for (int fd : clients) close(fd);
+  EXPECT_EQ("CLEANSUCCESS", send_commands({"DELETELOG"}));
+
+  // One that goes away with the answer unread.
+  int rude = connect_to_daemon();
+  log.clear();
+  send_all(rude, message("DELETELOG"));
+  ASSERT_TRUE(log.has("clean log CLEANSUCCESS \n"));
+  usleep(50'000);
+  close(rude);
+  EXPECT_TRUE(log.has("corvexd: read error: Connection reset by peer\n"));
+
+  // One that sends more than it ever reads answers of, until both stand still.
+  struct pollfd flooding = {connect_to_daemon(), POLLOUT, 0};
+  const std::string flood = message("DELETELOG");
+  while (poll(&flooding, 1, 1000) == 1) {
+    ASSERT_EQ(flood.size(), send(flooding.fd, flood.data(), flood.size(), MSG_NOSIGNAL));
+  }
+  close(flooding.fd);
+  EXPECT_EQ("CLEANSUCCESS", send_commands({"DELETELOG"}));
+  EXPECT_TRUE(eventually([&] { return list(descriptors).size() <= idle; }));
 }
 
 TEST_F(ControlSocket, ClientsSeeTheEndOfTheDaemonThoughItsReadersLiveOn) {
