@@ -23,9 +23,6 @@ namespace {
 
 constexpr mode_t kMarkerMode = 0644;
 
-// What does not fit is cut: an artefact with a very long name is kept under the part that fits.
-using LongPath = PathBuffer<256>;
-
 enum class Below { kNothing, kTimestamp, kName };  // a level below the category
 
 struct Destination {
@@ -77,24 +74,26 @@ void provide_media_marker() {
   if (marker != -1) give_to_system(marker);
 }
 
-void copy_to(const LongPath& source, const LongPath& destination, const char* name) {
+void copy_to(int folder, const LongPath& destination, const char* name, const LongPath& source) {
   LongPath to(destination);
-  copy_file(source.c_str(), to.append(name).c_str());
+  to.append(name);
+  copy_file_at(folder, strrchr(to.c_str(), '/') + 1, source.c_str(), to.c_str());
 }
 
-void copy_artefact(const char* dir, const char* name, const LongPath& destination) {
+// `folder` is the destination's.
+void copy_artefact(const char* dir, const char* name, const LongPath& destination, int folder) {
   LongPath source;
   source.append(dir).append("/").append(name);
   struct stat status;
   bool is_folder = lstat(source.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-  if (!is_folder) return copy_to(source, destination, name);
-  Directory folder = open_directory(source.c_str());
-  if (!folder) return;
-  while (struct dirent* entry = next_entry(folder)) {
-    if (is_directory(folder, *entry)) continue;
+  if (!is_folder) return copy_to(folder, destination, name, source);
+  Directory files = open_directory(source.c_str());
+  if (!files) return;
+  while (struct dirent* entry = next_entry(files)) {
+    if (is_directory(files, *entry)) continue;
     LongPath file(source);
     file.append("/").append(entry->d_name);
-    copy_to(file, destination, entry->d_name);
+    copy_to(folder, destination, entry->d_name, file);
   }
 }
 
@@ -118,6 +117,7 @@ int movefile(const char* dir, const char* name) {
     if (access(earlier.c_str(), R_OK) == 0) unlink(earlier.c_str());
   }
   mkdirs(destination.c_str());
+  const unique_fd folder = open_parent(destination.c_str());
   lock.unlock();
   log_error("corvexd: movefile: %s\n", destination.c_str());
   if (strstr(dir, "Screenshots") != nullptr) provide_media_marker();
@@ -126,7 +126,7 @@ int movefile(const char* dir, const char* name) {
     log_error("corvexd: Error: %s\n", strerror(errno));
     return -1;
   }
-  copy_artefact(dir, name, destination);
+  copy_artefact(dir, name, destination, folder);
   return 0;
 }
 

@@ -11,6 +11,7 @@
 #include <unistd.h>
 
 #include "collect/artefact_mover.h"
+#include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
 #include "core/pause.h"
@@ -28,8 +29,6 @@ constexpr size_t kBufferSize = 32768;
 constexpr char kScreenshots[] = "/data/media/0/Pictures/Screenshots";
 constexpr uint32_t kScreenshotEvents = IN_MODIFY | IN_CLOSE_WRITE | IN_CREATE;
 constexpr char kTraces[] = "/data/anr/";
-
-using LongPath = PathBuffer<256>;  // what does not fit is cut
 
 struct Watch {
   const char* directory;
@@ -104,16 +103,18 @@ void begin_trace(ObserverState& state, const char* name) {
   // Before the first capture there is no log directory, and nothing is to be made elsewhere.
   if (*LOG_DIR.get().c_str() == '\0') return;
   LongPath directory;
+  unique_fd folder;
   {
     std::lock_guard<std::mutex> lock(current_directory_mutex);
     directory.append(LOG_DIR.get().c_str()).append("/anr/");
     directory.append(local_timestamp().c_str()).append("/");
     mkdirs(directory.c_str());
+    folder = open_parent(directory.c_str());
   }
   state.anr_directory = directory;
   for (const BinderState& binder : kBinderStates) {
     LongPath target(directory);
-    copy_file(binder.source, target.append(binder.name).c_str());
+    copy_file_at(folder, binder.name, binder.source, target.append(binder.name).c_str());
   }
   dump_input(directory);
 }

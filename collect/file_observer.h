@@ -14,7 +14,7 @@ void* file_observer(void*);
 // What the observer knows between events.
 struct ObserverState {
   int inotify_fd = -1;
-  PathBuffer<256> anr_directory;  // of the latest trace; empty before the first
+  LongPath anr_directory;  // of the latest trace; empty before the first
 };
 
 // Acts on one read's worth of inotify records, however they are torn. Observer thread.

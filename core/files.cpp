@@ -5,7 +5,10 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "core/path_buffer.h"
 #include "core/state.h"
+
+using android::base::unique_fd;
 
 namespace corvexd {
 namespace {
@@ -46,11 +49,21 @@ int make_directory(const char* path, mode_t mode) {
 }
 
 int open_with_mode(const char* path, int flags, mode_t mode) {
+  return open_with_mode_at(AT_FDCWD, path, flags, mode);
+}
+
+int open_with_mode_at(int parent, const char* name, int flags, mode_t mode) {
   flags |= O_CREAT | O_CLOEXEC;
-  int fd = open(path, flags | O_EXCL, mode);
-  if (fd == -1) return errno == EEXIST ? open(path, flags, mode) : -1;
+  int fd = openat(parent, name, flags | O_EXCL, mode);
+  if (fd == -1) return errno == EEXIST ? openat(parent, name, flags, mode) : -1;
   fchmod(fd, mode);
   return fd;
+}
+
+unique_fd open_parent(const char* path) {
+  LongPath parent;
+  parent.append(path, strrchr(path, '/') + 1 - path);
+  return unique_fd(open(parent.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
 }
 
 int give_to_system(const char* path) {

@@ -1,6 +1,7 @@
 // Directories, files and owners: what the rooms share of the file system.
 #pragma once
 
+#include <android-base/unique_fd.h>
 #include <dirent.h>
 #include <sys/stat.h>
 
@@ -29,6 +30,12 @@ bool is_directory(const Directory& directory, const struct dirent& entry);
 // O_CREAT and O_CLOEXEC to `flags`; the caller owns the descriptor. -1 with errno set on failure.
 int make_directory(const char* path, mode_t mode);
 int open_with_mode(const char* path, int flags, mode_t mode);
+int open_with_mode_at(int parent, const char* name, int flags, mode_t mode);
+
+// Opens the directory in which the last name of `path` stands (`path` itself when it ends in "/"),
+// to make files there by name even after it was renamed. Close-on-exec; -1 with errno set on
+// failure.
+android::base::unique_fd open_parent(const char* path);
 
 // Give a path or an open file to the system user while the log root lies in the data partition;
 // elsewhere do nothing. 0, or -1 with errno set.

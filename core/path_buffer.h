@@ -64,4 +64,8 @@ class PathBuffer {
 constexpr size_t kPathSize = 200;
 using Path = PathBuffer<kPathSize>;
 
+// For what is cut where it does not fit: an artefact with a very long name is kept under the part
+// that fits.
+using LongPath = PathBuffer<256>;
+
 }  // namespace corvexd

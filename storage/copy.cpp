@@ -9,6 +9,7 @@
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "core/state.h"
+#include "storage/current_directory.h"
 
 using android::base::unique_fd;
 
@@ -29,15 +30,18 @@ void copy_content(int from, int to) {
   }
 }
 
-// Makes sure that `path` is a directory; false when it cannot be made.
-bool provide_folder(const char* path) {
-  unique_fd existing(open(path, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (existing != -1) return true;
+// Opens the directory `path`, made when missing; false when it cannot be made. Kept open, it takes
+// the copies even after a new capture has renamed what it lies in.
+bool open_or_make_folder(const char* path, unique_fd* folder) {
+  constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
+  folder->reset(open(path, kFlags));
+  if (*folder != -1) return true;
   if (make_directory(path, kFolderMode) != 0) {
     log_error("corvexd: fail to mkdir");
     return false;
   }
   give_to_system(path);
+  folder->reset(open(path, kFlags));
   return true;
 }
 
@@ -49,11 +53,13 @@ bool is_file(const char* path) {
 
 }  // namespace
 
-int copy_file(const char* src, const char* dst) {
+int copy_file(const char* src, const char* dst) { return copy_file_at(AT_FDCWD, dst, src, dst); }
+
+int copy_file_at(int folder, const char* name, const char* src, const char* dst) {
   log_error("corvexd: copy_file %s '%s'", src, dst);
   // Neither end may hold up the daemon when it is a FIFO; plain files do not notice the flag.
   unique_fd from(open(src, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  unique_fd to(open_with_mode(dst, O_WRONLY | O_APPEND | O_NONBLOCK, kFileMode));
+  unique_fd to(open_with_mode_at(folder, name, O_WRONLY | O_APPEND | O_NONBLOCK, kFileMode));
   if (from == -1 && to == -1) {
     log_error("corvexd: open file failure. %s, %s", src, dst);
     return -1;
@@ -72,19 +78,21 @@ void copy_folder(const char* src_dir, const char* sub) {
   log_error("corvexd : copy folder %s : %s", src_dir, sub);
   Directory source = open_directory(src_dir);
   if (!source) return;
-  Path folder = LOG_DIR.get();
+  std::unique_lock<std::mutex> lock(current_directory_mutex);
+  Path path = LOG_DIR.get();
   // Before the first capture there is no log directory, and nothing is to be made elsewhere.
-  if (*folder.c_str() == '\0') {
+  if (*path.c_str() == '\0') {
     log_error("corvexd: fail to mkdir");
     return;
   }
-  if (!folder.append(sub).fits_or_log()) return;
-  if (!provide_folder(folder.c_str())) return;
+  unique_fd folder;
+  if (!path.append(sub).fits_or_log() || !open_or_make_folder(path.c_str(), &folder)) return;
+  lock.unlock();
   while (struct dirent* entry = next_entry(source)) {
     Path from = Path().append(src_dir).append(entry->d_name);
-    Path to = Path(folder).append(entry->d_name);
+    Path to = Path(path).append(entry->d_name);
     if (!from.fits_or_log() || !to.fits_or_log()) continue;
-    if (is_file(from.c_str())) copy_file(from.c_str(), to.c_str());
+    if (is_file(from.c_str())) copy_file_at(folder, entry->d_name, from.c_str(), to.c_str());
   }
 }
 

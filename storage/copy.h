@@ -9,6 +9,9 @@ namespace corvexd {
 // (logged); what a read or write error in the middle leaves stays.
 int copy_file(const char* src, const char* dst);
 
+// The same to the file `name` in the open directory `folder`; `dst` is its path for the log.
+int copy_file_at(int folder, const char* name, const char* src, const char* dst);
+
 // Copies every entry of `src_dir` that is not a directory into LOG_DIR + `sub`, which is made (one
 // level) when missing. Both names end in "/". Any thread; LOG_DIR is read once, at the start. What
 // cannot be copied is logged and passed over.

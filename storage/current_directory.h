@@ -16,8 +16,8 @@ enum class WhichMark { kFirst, kLast };  // in the order of the listing
 bool find_current_directory(WhichMark which, Path* path);
 
 // Held for the moment in which the mark passes to a new directory, and by a worker from looking up
-// the current directory until it has made its own below it: otherwise it could make the old one
-// anew, beside the one that had just lost the mark.
+// the current directory until it has made and opened its own below it: otherwise it could make the
+// old one anew, beside the one that had just lost the mark.
 extern std::mutex current_directory_mutex;
 
 }  // namespace corvexd
