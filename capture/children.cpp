@@ -19,7 +19,7 @@
 //   with SIGCHLD blocked on the taking thread, so the handler never waits for the thread that it
 //   interrupted, and nobody who holds it blocks: a slot that says "running" cannot lose its child
 //   between the test and the kill.
-// - No lock of ours is held across fork(). The C library takes its allocation locks there; a thread
+// - It is never held across fork(). The C library takes its allocation locks there; a thread
 //   interrupted inside an allocation would otherwise spin in the handler for a lock whose owner
 //   waits for that very allocation.
 // - Between a fork and the storing of its result nobody can tell which slot a child belongs to.
