@@ -8,6 +8,13 @@
 #include <regex>
 
 namespace corvexd::faults {
+
+std::string callers(const Call& call) {
+  std::string all;
+  for (const std::string& function : call.functions) all = function + " " + all;
+  return all;
+}
+
 namespace {
 
 // What a failed call must lead to. The first row that fits counts; where none does, the daemon
@@ -16,8 +23,9 @@ struct Consequence {
   const char* call;      // its name, a pattern
   const char* path;      // a pattern
   const char* function;  // in whose run it was made; may be null
-  const char* line;      // %p is the call's path, %e the error; null for none
-  bool ends = false;     // the daemon ends with status 1
+  // %p is the call's path, %n the name that it ends in, %e the error, * anything; null for none.
+  const char* line;
+  bool ends = false;  // the daemon ends with status 1
   bool repeats_interrupted = false;
 };
 
@@ -38,6 +46,7 @@ const Consequence kConsequences[] = {
     {"openat", "/.*/corvex", "renameLastDirectoryName", "corvexd: Error: %e\n"},
     {"openat", "/.*/corvex", "createLogDirectory", "corvexd: pdir is null! \n"},
     {"openat", "/.*/corvex", "deleteLog", "corvexd: opendir %p  %e \n "},
+    {"openat", ".*", "mkdirs", nullptr},
     {"openat", "/.*/corvex|/data/.*", "movefile.*open_directory", "corvexd: Error: %e\n"},
     {"rename", "/data/corvex/KVBR_.*_current", nullptr, "corvexd: Rename failed! Error: %e\n"},
     {"rename", "/cache/boot_log/.*", nullptr, "corvexd: Rename %p failed! Error: %e\n"},
@@ -50,12 +59,12 @@ const Consequence kConsequences[] = {
      ".*/(kv_tsen_data|tombstones(/.*)?|media(/.*)?|dropbox|rawdata(/.*)?|Screenshots|"
      "coredump|BatteryHistory|anr/.*)",
      "mkdirs", "corvexd: fail to chown, path is %p \n"},
-    {"openat", ".*", "copy_file\\(", "corvexd: open file failure. %p"},
+    {"openat", ".*", "copy_file_at\\(", "corvexd: open file failure. */%n"},
 
     {"unlinkat", ".*", nullptr, "corvexd: can't remove '%p'"},
     {"newfstatat", "/data/corvex/.*|/storage/.*", "deleteLog", "corvexd: can't stat '%p' %e "},
-    {"unlink", "/cache/.*", nullptr, "corvexd: can't remove %p \n"},
     {"unlink", ".*/anr/.*", nullptr, "corvexd: can't remove %p'"},
+    {"unlink", "/cache/.*", nullptr, "corvexd: can't remove %p \n"},
 
     {"access", "/dev/kmsg", nullptr, "corvexd: Kernel log node can not be read: %e \n"},
     {"access", "/proc/tzdbg/qsee_log", nullptr, "corvexd: qsee log node can not be read: %e \n"},
@@ -112,22 +121,36 @@ const Consequence* find_consequence(const Call& call) {
 }
 
 std::string fill_in(const char* line, const Call& call) {
+  const std::string name = call.path.substr(call.path.rfind('/') + 1);
   std::string text = line;
-  for (const auto& [mark, value] : {std::pair{"%p", call.path}, std::pair{"%e", call.error}}) {
+  for (const auto& [mark, value] :
+       {std::pair{"%p", call.path}, std::pair{"%n", name}, std::pair{"%e", call.error}}) {
     size_t at = text.find(mark);
     if (at != std::string::npos) text.replace(at, 2, value);
   }
   return text;
 }
 
+bool is_in(const std::vector<std::string>& log, const std::string& line) {
+  const size_t star = line.find('*');
+  const std::string start = line.substr(0, star);
+  const std::string end = star == std::string::npos ? "" : line.substr(star + 1);
+  return std::any_of(log.begin(), log.end(), [&](const std::string& text) {
+    size_t at = text.find(start);
+    return at != std::string::npos && text.find(end, at + start.size()) != std::string::npos;
+  });
+}
+
 void judge_call(const Call& call, Life& life, bool* may_end) {
   if (!call.injected || call.error.empty()) return;
   const Consequence* row = find_consequence(call);
-  if (row == nullptr || (row->repeats_interrupted && call.error == strerror(EINTR))) return;
+  if (row == nullptr || row->line == nullptr ||
+      (row->repeats_interrupted && call.error == strerror(EINTR)))
+    return;
   // Ended together with the daemon, a thread says nothing more.
   if (life.status == 1 && !row->ends) return;
   const std::string line = fill_in(row->line, call);
-  if (std::find(life.log.begin(), life.log.end(), line) == life.log.end()) {
+  if (!is_in(life.log, line)) {
     life.problems.push_back("lacks the line \"" + line + "\"");
   }
   if (!row->ends) return;
@@ -135,22 +158,25 @@ void judge_call(const Call& call, Life& life, bool* may_end) {
   if (life.status == -1) life.problems.push_back("goes on after \"" + line + "\"");
 }
 
+// Where the start waits, with pauses, as long as it must.
+bool is_waiting(const Call& call) {
+  return call.path == "/data/.layout_version" ||
+         callers(call).find("corvexd::wait_for_data_partition") != std::string::npos;
+}
+
 // One that does not take no for an answer uses up all the refusals there are.
 void judge_stubbornness(Life& life) {
   std::map<std::string, int> refusals;
   for (const Call& call : life.calls) {
-    int count = call.injected ? ++refusals[call.name + call.path + call.site] : 0;
-    if (count == kShieldCalls / 2) life.problems.push_back("repeats " + call.name + " without end");
+    if (!call.injected || is_waiting(call)) continue;
+    const std::string place = call.name + " of " + call.path + " in " + callers(call);
+    if (++refusals[place] == kShieldCalls / 2) {
+      life.problems.push_back("repeats " + place + " without end");
+    }
   }
 }
 
 }  // namespace
-
-std::string callers(const Call& call) {
-  std::string all;
-  for (const std::string& function : call.functions) all = function + " " + all;
-  return all;
-}
 
 void judge(Life& life) {
   judge_stubbornness(life);
