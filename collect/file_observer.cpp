@@ -3,8 +3,6 @@
 #include <android-base/unique_fd.h>
 #include <cutils/properties.h>
 #include <errno.h>
-#include <limits.h>
-#include <stdint.h>
 #include <stdio.h>
 #include <string.h>
 #include <sys/inotify.h>
@@ -157,22 +155,27 @@ bool persistent_capture_is_on() {
 
 }  // namespace
 
-void handle_events(ObserverState& state, const char* records, size_t size) {
-  struct inotify_event event;
-  while (size >= sizeof event) {
-    memcpy(&event, records, sizeof event);
-    const char* name_field = records + sizeof event;
-    if (event.len > size - sizeof event) return;
-    char name[NAME_MAX + 1];
-    size_t length = strnlen(name_field, event.len);
-    if (event.len > 0 && length < sizeof name) {
-      memcpy(name, name_field, length);
-      name[length] = '\0';
-      handle_event(state, event.mask, name);
-    }
-    records += sizeof event + event.len;
-    size -= sizeof event + event.len;
+bool EventReader::read(Event* event) {
+  struct inotify_event record;
+  while (left_ >= sizeof record) {
+    memcpy(&record, next_, sizeof record);
+    const char* name = next_ + sizeof record;
+    if (record.len > left_ - sizeof record) return false;
+    next_ += sizeof record + record.len;
+    left_ -= sizeof record + record.len;
+    const size_t length = strnlen(name, record.len);
+    if (record.len == 0 || length >= sizeof event->name) continue;
+    event->mask = record.mask;
+    memcpy(event->name, name, length);
+    event->name[length] = '\0';
+    return true;
   }
+  return false;
+}
+
+void handle_events(ObserverState& state, const char* records, size_t size) {
+  EventReader reader(records, size);
+  for (Event event; reader.read(&event);) handle_event(state, event.mask, event.name);
 }
 
 void* file_observer(void*) {

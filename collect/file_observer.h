@@ -1,7 +1,9 @@
 // The watch over the directories where crash and diagnostic artefacts appear.
 #pragma once
 
+#include <limits.h>
 #include <stddef.h>
+#include <stdint.h>
 
 #include "core/path_buffer.h"
 
@@ -10,6 +12,24 @@ namespace corvexd {
 // Thread body: hands artefacts to the mover as they appear, while persistent capture is on. Returns
 // only when inotify fails.
 void* file_observer(void*);
+
+struct Event {
+  uint32_t mask;
+  char name[NAME_MAX + 1];
+};
+
+// The events with a name in one read's worth of inotify records, however they are torn.
+class EventReader {
+ public:
+  EventReader(const char* records, size_t size) : next_(records), left_(size) {}
+
+  // Sets *event to the next one; false when there is none any more.
+  bool read(Event* event);
+
+ private:
+  const char* next_;
+  size_t left_;
+};
 
 // What the observer knows between events.
 struct ObserverState {
