@@ -101,10 +101,14 @@ void start_worker(int output, const Body& body) {
   _exit(0);
 }
 
+std::string without_times(const std::string& text) {
+  static const std::regex time("[0-9]{4}(-[0-9]{2}){5}");
+  return std::regex_replace(text, time, "TIME");
+}
+
 void say(const std::string& kind, const std::string& text) {
-  static const std::regex time("[0-9]{4}(-[0-9]{2}){5}"), line_end("\n");
-  const std::string line =
-      std::regex_replace(std::regex_replace(text, time, "TIME"), line_end, "\\n");
+  static const std::regex line_end("\n");
+  const std::string line = std::regex_replace(without_times(text), line_end, "\\n");
   // One write, so that the workers' lines do not mix.
   std::string bytes = kind + " " + line.substr(0, 4000) + "\n";
   ssize_t ignored = write(STDOUT_FILENO, bytes.data(), bytes.size());
@@ -146,7 +150,8 @@ void try_fault(const Fault& fault) {
     judge(life);
     for (const Call& call : life.calls) say("hit", call.name + " " + call.site);
     if (!life.calls.empty()) where = life.calls[0].path + " in " + callers(life.calls[0]);
-    const std::set<std::string> problems(life.problems.begin(), life.problems.end());
+    std::set<std::string> problems;
+    for (const std::string& problem : life.problems) problems.insert(without_times(problem));
     for (const std::string& problem : problems) ++seen[problem];
     if (seen.empty()) break;
   }
