@@ -149,6 +149,7 @@ int main(int argc, char** argv) {
   __android_log_set_logger([](const struct __android_logger_data* data, const char*) {
     if (data->priority >= ANDROID_LOG_ERROR) corvexd::error_logged = true;
   });
+  corvexd::isInDataPartition = 0;  // whoever measures keeps what is made
   for (const corvexd::Job& job : corvexd::kJobs) {
     if (argc < job.fewest + 2 || argc > job.most + 2 || strcmp(argv[1], job.name) != 0) continue;
     return job.run(argv + 2);
