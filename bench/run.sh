@@ -94,4 +94,6 @@ client="$here/serve.sh client $floor $work/socket 2000"
 compare "socket: 2,000 connections of ten commands" "rm -f socket" \
   ours "$client $driver socket $work/socket" floor "$client $floor socket $work/socket"
 
+"$programs/scale" 2>/dev/null
 "$programs/boot_time"
+"$here/footprint.sh" "$programs/.."
