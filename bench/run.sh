@@ -84,11 +84,11 @@ compare "fstab: 30 lines, 5,000 times" true \
   libmount "$programs/libmount_fstab fstab 5000"
 
 tree 1000
-watch="$here/serve.sh watch staged watched root/1_current"
+watch="$here/serve.sh watch staged watched $work/root/1_current"
 compare "watch: 1,000 artefacts of 4 KiB" \
   "rm -rf staged watched root && cp -r tree/0 staged && mkdir -p watched root/1_current" \
-  ours "$watch $driver watch watched root" floor "$watch $floor watch watched root" \
-  "inotifywait and cp" "$watch $here/inotify_copy.sh watched root/1_current"
+  ours "$watch $driver watch watched $work/root" floor "$watch $floor watch watched $work/root" \
+  "inotifywait and cp" "$watch $here/inotify_copy.sh watched $work/root/1_current"
 
 client="$here/serve.sh client $floor $work/socket 2000"
 compare "socket: 2,000 connections of ten commands" "rm -f socket" \

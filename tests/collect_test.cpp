@@ -266,15 +266,10 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   send_commands({"WIFI_SNIFFLOG_STOP", "WIFI_SNIFFLOG_START"});
   std::vector<ProbeReport> first = probe_reports(3);
   ASSERT_EQ(3u, first.size());
-  Texts lines;
-  for (const ProbeReport& report : first) {
-    std::string line;
-    for (const std::string& argument : report.arguments) line += argument + " ";
-    lines.push_back(line);
-  }
+  Texts lines = command_lines(first);
   std::sort(lines.begin(), lines.end());
   EXPECT_EQ(
-      (Texts{"iwpriv wlan0 pktlog 0 ", "iwpriv wlan0 pktlog 1 ", "pktlogconf -s 16000000 -a cld "}),
+      (Texts{"iwpriv wlan0 pktlog 0", "iwpriv wlan0 pktlog 1", "pktlogconf -s 16000000 -a cld"}),
       lines);
   EXPECT_TRUE(log.has("wifi_snifflog_stop"));
   EXPECT_TRUE(log.has("corvexd:wifi_snifflog_start...sniff_set...\n"));
@@ -282,12 +277,9 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   send_commands({"WIFI_SNIFFLOG_START"});
   EXPECT_EQ(5u, probe_reports(5).size());
   EXPECT_TRUE(eventually([&] {
-    size_t ended = 0;
-    for (const ProbeReport& report : first) {
-      ended += read_file("/proc/" + std::to_string(report.pid) + "/cmdline").empty();
-    }
-    return ended == 2;  // the stop job's child lives on
-  }));
+    return std::count_if(first.begin(), first.end(),
+                         [](const auto& report) { return has_ended(report.pid); }) == 2;
+  })) << "the stop job's child lives on";
 }
 
 }  // namespace

@@ -196,8 +196,7 @@ TEST_F(Reader, BootloaderLogIsCopiedToItsEnd) {
 TEST_F(Reader, TheMachinesKernelLogIsCaptured) {
   int kernel = open("/dev/kmsg", O_WRONLY);
   if (kernel == -1 || !owners_work()) GTEST_SKIP() << "the kernel log needs root";
-  set_property("persist.sys.kernel", "yes");
-  set_property("persist.sys.kernel.kmsg", "yes");
+  switch_on({"kernel", "kernel.kmsg"});
   Daemon daemon(log);
   send_commands({"LOGBEGIN"});
   const std::string mark = "corvexd test line " + std::to_string(getpid());

@@ -29,9 +29,7 @@ class Reliability : public DeviceTest {
     umount2("/dev/kmsg", MNT_DETACH);
     run("rm -f /dev/kmsg && mkfifo /dev/kmsg");
     kernel_ = open("/dev/kmsg", O_RDWR | O_NONBLOCK | O_CLOEXEC);
-    set_property("persist.sys.kernel", "yes");
-    set_property("persist.sys.kernel.kmsg", "yes");
-    set_property("persist.sys.main", "yes");
+    switch_on({"kernel", "kernel.kmsg", "main"});
     producer_ = std::thread([this] { produce(); });
   }
   ~Reliability() override {
