@@ -8,7 +8,10 @@
 #include "capture/recorders.h"
 #include "core/pause.h"
 #include "core/thread.h"
+#include "storage/capture_paths.h"
+#include "storage/current_directory.h"
 #include "storage/earlier_logs.h"
+#include "storage/log_directory.h"
 
 namespace corvexd {
 namespace {
@@ -48,6 +51,16 @@ void close_slot(int32_t* descriptor) {
 }
 
 }  // namespace
+
+void begin_capture() {
+  {
+    std::lock_guard<std::mutex> lock(current_directory_mutex);
+    renameLastDirectoryName();
+    createLogDirectory();
+  }
+  makeLogAbsolutePath();
+  executeLogcat();
+}
 
 void executeLogcat() {
   handle_ended_children();

@@ -3,6 +3,10 @@
 
 namespace corvexd {
 
+// Passes the mark of the current log directory to a new one and starts a capture into it. Main
+// thread.
+void begin_capture();
+
 // Starts a capture into LOG_DIR: dumps the properties, starts the thread that copies earlier logs
 // and every recorder whose switch is on. Main thread. Returns after about two seconds and waits for
 // no recorder; one that could not be started is missing from this capture. A capture already

@@ -12,24 +12,15 @@
 #include "connectivity/wifi_sniffer.h"
 #include "core/log.h"
 #include "core/state.h"
-#include "storage/capture_paths.h"
-#include "storage/current_directory.h"
 #include "storage/delete.h"
-#include "storage/log_directory.h"
 #include "thermal/thermal_sampler.h"
 
 namespace corvexd {
 namespace {
 
-void begin_capture(int) {
+void begin_capture_anew(int) {
   checkLogPath();
-  {
-    std::lock_guard<std::mutex> lock(current_directory_mutex);
-    renameLastDirectoryName();
-    createLogDirectory();
-  }
-  makeLogAbsolutePath();
-  executeLogcat();
+  begin_capture();
 }
 
 void answer(int connection, const char* reply) {
@@ -71,7 +62,7 @@ struct Command {
 };
 
 constexpr Command kCommands[] = {
-    {"LOGBEGIN", begin_capture},
+    {"LOGBEGIN", begin_capture_anew},
     {"LOGSTOP", [](int) { stopLogcat(); }},
     {"CACHECLEAR", [](int) { cacheClear(); }},
     {"BUGREPORT", [](int) { getBugreport(); }},

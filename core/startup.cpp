@@ -10,8 +10,6 @@
 #include "core/pause.h"
 #include "core/state.h"
 #include "fs_mgr/fs_mgr_fstab.h"
-#include "storage/capture_paths.h"
-#include "storage/log_directory.h"
 
 namespace corvexd {
 namespace {
@@ -77,10 +75,7 @@ void start_persistent_capture() {
   property_get("persist.sys.assert.panic", panic, "false");
   log_debug("corvexd: in function %s, persist.sys.assert.panic = %s\n", "main", panic);
   if (strcmp(panic, "true") != 0) return;
-  renameLastDirectoryName();
-  createLogDirectory();
-  makeLogAbsolutePath();
-  executeLogcat();
+  begin_capture();
 }
 
 void start_diagnostic_service() {
