@@ -12,6 +12,8 @@
 #include <sys/un.h>
 #include <unistd.h>
 
+#include <string>
+
 namespace {
 
 constexpr size_t kBlock = 1024;
@@ -211,14 +213,14 @@ int run_socket(char** arguments) {
 // The other end of a socket job: so many connections of ten commands that nobody knows.
 int run_client(char** arguments) {
   const struct sockaddr_un address = address_of(arguments[0]);
-  char ten[10 * 6];
-  for (int i = 0; i < 10; ++i) memcpy(ten + 6 * i, "\x04\0NONE", 6);
+  std::string ten;
+  for (int i = 0; i < 10; ++i) ten.append("\x04\0NONE", 6);
   for (int i = atoi(arguments[1]); i > 0; --i) {
     int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
     char end;
     if (connect(fd, reinterpret_cast<const struct sockaddr*>(&address), sizeof address) != 0 ||
-        write(fd, ten, sizeof ten) != sizeof ten || shutdown(fd, SHUT_WR) != 0 ||
-        read(fd, &end, 1) != 0) {
+        write(fd, ten.data(), ten.size()) != static_cast<ssize_t>(ten.size()) ||
+        shutdown(fd, SHUT_WR) != 0 || read(fd, &end, 1) != 0) {
       return 1;
     }
     close(fd);

@@ -37,7 +37,7 @@ void touch(const std::string& path) { close(creat(path.c_str(), 0600)); }
 
 void BM_NewLogDirectory(benchmark::State& state) {
   make_log_root(state.range(0));
-  for (auto _ : state) {
+  while (state.KeepRunning()) {
     renameLastDirectoryName();
     createLogDirectory();
     state.PauseTiming();
@@ -52,7 +52,7 @@ void BM_CollectArtefact(benchmark::State& state) {
   make_log_root(state.range(0));
   run("mkdir /data/coredump");
   write_file("/data/coredump/core", "c");
-  for (auto _ : state) movefile("/data/coredump", "core");  // replaces the earlier copy
+  while (state.KeepRunning()) movefile("/data/coredump", "core");  // replaces the earlier copy
   state.SetComplexityN(state.range(0));
 }
 BENCHMARK(BM_CollectArtefact)->RangeMultiplier(10)->Range(1, 1000)->Complexity(benchmark::oN);
@@ -62,7 +62,7 @@ void BM_Rotate(benchmark::State& state) {
   const std::string path = std::string(kRoot) + "kernel.log";
   const int count = static_cast<int>(state.range(0));
   for (int i = 1; i <= count; ++i) touch(path + "." + std::to_string(i));
-  for (auto _ : state) {
+  while (state.KeepRunning()) {
     state.PauseTiming();
     touch(path);
     state.ResumeTiming();
@@ -74,7 +74,7 @@ BENCHMARK(BM_Rotate)->RangeMultiplier(10)->Range(1, 1000)->Complexity(benchmark:
 
 void BM_Delete(benchmark::State& state) {
   make_empty_device();
-  for (auto _ : state) {
+  while (state.KeepRunning()) {
     state.PauseTiming();
     for (int64_t i = 0; i < state.range(0); ++i) {
       const std::string directory = kRoot + std::to_string(i / 1000);
@@ -89,7 +89,7 @@ void BM_Delete(benchmark::State& state) {
 BENCHMARK(BM_Delete)->RangeMultiplier(10)->Range(1000, 100'000)->Complexity(benchmark::oN);
 
 void BM_UnknownCommand(benchmark::State& state) {
-  for (auto _ : state) run_command("LOGBEGIN ", -1);
+  while (state.KeepRunning()) run_command("LOGBEGIN ", -1);
 }
 BENCHMARK(BM_UnknownCommand);
 
@@ -104,7 +104,7 @@ void BM_EventsOfNoInterest(benchmark::State& state) {
     records.append(std::string("entry").append(16, '\0'), 0, 16);
   }
   ObserverState observer;
-  for (auto _ : state) handle_events(observer, records.data(), records.size());
+  while (state.KeepRunning()) handle_events(observer, records.data(), records.size());
   state.SetItemsProcessed(state.iterations() * static_cast<int64_t>(records.size()) / 32);
 }
 BENCHMARK(BM_EventsOfNoInterest);
