@@ -27,6 +27,14 @@ constexpr bool kSanitized = true;
 constexpr bool kSanitized = false;
 #endif
 
+// The address sanitizer's allocator, unlike the C library's, does not survive a fork beside threads
+// that are inside it.
+#ifdef __SANITIZE_ADDRESS__
+constexpr bool kChildrenMayAllocate = false;
+#else
+constexpr bool kChildrenMayAllocate = true;
+#endif
+
 ChildSlot slots[4];
 
 void end_at_once(const void*) {}
@@ -45,10 +53,9 @@ void allocate(size_t size) {
   free(memory);
 }
 
-// What the daemon's own readers and samplers may do before they end. The address sanitizer's
-// allocator, unlike the C library's, does not survive a fork beside threads that are inside it.
+// What the daemon's own readers and samplers may do before they end.
 void work_and_end(const void*) {
-  for (int i = 0; i < 20 && !kSanitized; ++i) allocate(64 << (i % 12));
+  for (int i = 0; i < 20 && kChildrenMayAllocate; ++i) allocate(64 << (i % 12));
   log_debug("%s\n", local_timestamp().c_str());
   raise(SIGCHLD);  // a child may have children, too
 }
@@ -230,7 +237,8 @@ TEST_F(Children, TwoHundredCapturesInAStormOfSignalsLeaveNothingBehind) {
     send_commands({"LOGBEGIN", "CPUTHERMAL"});
     Bystanders bystanders;
     write_file("/data/tombstones/tombstone", "t");
-    send_commands({"BUGREPORT", "STOPCPUTHERMAL", "LOGSTOP"});
+    if (kChildrenMayAllocate) send_commands({"BUGREPORT"});
+    send_commands({"STOPCPUTHERMAL", "LOGSTOP"});
     if (round == 19) before = usage_of(daemon.pid());
   }
   run("pkill -KILL 'logcat|tcpdump'");
@@ -245,6 +253,7 @@ TEST_F(Children, TwoHundredCapturesInAStormOfSignalsLeaveNothingBehind) {
   long allowed = kSanitized ? 100'000 : 256;
   EXPECT_LT(after.kilobytes, before.kilobytes + allowed);
   EXPECT_EQ(0u, log.count("abnormally"));
+  if (!kChildrenMayAllocate) return;
   run("[ $(cat /data/corvex/*/*-BUGREPORT.log | grep -c '^report$') = 200 ]");
 }
 
