@@ -27,13 +27,9 @@ constexpr bool kSanitized = true;
 constexpr bool kSanitized = false;
 #endif
 
-// The address sanitizer's allocator, unlike the C library's, does not survive a fork beside threads
-// that are inside it.
-#ifdef __SANITIZE_ADDRESS__
-constexpr bool kChildrenMayAllocate = false;
-#else
-constexpr bool kChildrenMayAllocate = true;
-#endif
+// The sanitizers' allocators, unlike the C library's, do not survive a fork beside threads that are
+// inside them.
+constexpr bool kChildrenMayAllocate = !kSanitized;
 
 ChildSlot slots[4];
 
