@@ -25,16 +25,16 @@ compare() {
   hyperfine --shell=none --warmup 1 --runs "$runs" --style none --export-json result.json \
     --prepare "sh -c '$preparation'" "${arguments[@]}" >hyperfine.log 2>&1 ||
     { cat hyperfine.log && return 1; }
-  jq -r '.results | .[1] as $floor | .[] | [.command, .median, .user + .system,
+  jq -r '.results | .[1] as $floor | .[] | [.command, .median, .user, .system,
     .median / $floor.median, (.user + .system) / ($floor.user + $floor.system)] | @tsv' result.json |
-    awk -F '\t' 'BEGIN { printf "  %-22s %9s %9s %9s %9s\n", "", "wall s", "cpu s", "of floor", "of floor" }
-      { printf "  %-22s %9.4f %9.4f %9.2f %9.2f\n", $1, $2, $3, $4, $5 }'
+    awk -F '\t' 'BEGIN { printf "  %-22s %9s %9s %9s %9s %9s\n",
+        "", "wall s", "user s", "system s", "wall", "cpu" }
+      { printf "  %-22s %9.4f %9.4f %9.4f %9.2f %9.2f\n", $1, $2, $3, $4, $5, $6 }'
 }
 
 fresh='rm -rf out && mkdir -p out && printf "s16777215\nn0\n" >out/config'
 
 lines() { awk -v count="$1" 'BEGIN { for (i = 1; i <= count; i++) printf "%01023d\n", i }' >source; }
-
 
 reader() { # TITLE, what comes before a reader and what it reads
   local title=$1 before=$2 source=$3
@@ -47,11 +47,11 @@ reader() { # TITLE, what comes before a reader and what it reads
     rotatelogs "sh -c '$before exec rotatelogs out/log 16M <$source'"
 }
 
-tree() { # COUNT of files of 4 KiB, a thousand to a directory
+tree() { # DIRECTORIES of so many FILES of 4 KiB
   rm -rf tree
-  for ((i = 0; i < $1 / 1000; i++)); do
+  for ((i = 0; i < $1; i++)); do
     mkdir -p "tree/$i"
-    head -c 4096000 /dev/zero | split -a 3 -b 4096 - "tree/$i/file_"
+    head -c $(($2 * 4096)) /dev/zero | split -a 4 -b 4096 - "tree/$i/file_"
   done
 }
 
@@ -65,12 +65,12 @@ compare "copy_file: 128 MiB" "rm -f copy" \
   "cp" "cp source copy"
 rm -f source copy
 
-tree 1000
-compare "copy_folder: 1,000 files of 4 KiB" "rm -rf log && mkdir -p log/copy" \
+tree 1 5000
+compare "copy_folder: 5,000 files of 4 KiB" "rm -rf log && mkdir -p log/copy" \
   ours "$driver copy_folder tree/0 log/copy" floor "$floor copy_folder tree/0 log/copy" \
   "cp -r" "cp -r tree/0 log/copy"
 
-tree 20000
+tree 20 1000
 compare "dirsize: 20,000 files" true \
   ours "$driver dirsize tree" floor "$floor dirsize tree" "du -sb" "du -sb tree"
 compare "delete: 20,000 files" "rm -rf gone && cp -r tree gone" \
@@ -83,15 +83,15 @@ compare "fstab: 30 lines, 5,000 times" true \
   ours "$driver fstab fstab 5000" "reading alone" "$floor fstab fstab 5000" \
   libmount "$programs/libmount_fstab fstab 5000"
 
-tree 1000
+tree 1 5000
 watch="$here/serve.sh watch staged watched $work/root/1_current"
-compare "watch: 1,000 artefacts of 4 KiB" \
+compare "watch: 5,000 artefacts of 4 KiB" \
   "rm -rf staged watched root && cp -r tree/0 staged && mkdir -p watched root/1_current" \
   ours "$watch $driver watch watched $work/root" floor "$watch $floor watch watched $work/root" \
   "inotifywait and cp" "$watch $here/inotify_copy.sh watched $work/root/1_current"
 
-client="$here/serve.sh client $floor $work/socket 2000"
-compare "socket: 2,000 connections of ten commands" "rm -f socket" \
+client="$here/serve.sh client $floor $work/socket 20000"
+compare "socket: 20,000 connections of ten commands" "rm -f socket" \
   ours "$client $driver socket $work/socket" floor "$client $floor socket $work/socket"
 
 "$programs/scale" 2>/dev/null
