@@ -94,14 +94,6 @@ TEST_F(Children, NoSignalReachesARecycledNumber) {
   EXPECT_EQ(1u, log.texts().size());
 }
 
-TEST_F(Children, AChildThatEndsAtOnceIsFoundInItsSlot) {
-  handle_ended_children();
-  for (int i = 0; i < 300; ++i) {
-    start_child(slots[0], end_at_once, nullptr);
-    ASSERT_TRUE(eventually([] { return !slots[0].running; })) << i;
-  }
-}
-
 TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   // A handler that interrupts an allocation waits for the log's reader, who allocates as well here.
   log.stop();
