@@ -36,7 +36,7 @@ namespace {
 constexpr int kReadyFd = 3;      // as init knows it
 constexpr int kPatience = 5000;  // milliseconds that init gets to shut down
 
-// The build folder that this program stands in.
+// The build folder that this program stands in; where it is installed, a folder laid out the same.
 std::string build_folder() {
   char path[PATH_MAX];
   ssize_t length = readlink("/proc/self/exe", path, sizeof path - 1);
