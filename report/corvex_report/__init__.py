@@ -1,0 +1,1 @@
+"""One page that tells what is in a log directory, and what is odd about it."""

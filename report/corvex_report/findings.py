@@ -1,0 +1,153 @@
+"""What is odd about a capture, each in one plain sentence. What every capture has is not odd."""
+
+from collections.abc import Iterable, Iterator
+
+from .artefacts import LOGS, MARKERS
+from .capture import Capture, LogFile, Series
+from .line_formats import DAY
+from .properties import VERSION_FIELD, version_text
+from .text import clock_text, counted, duration_text, shown
+from .thermal import Record
+from .tracks import STEP_BACK, Step
+
+SETTLED = 300.0  # seconds of silence that no log is blamed for
+PAUSE = 30.0  # seconds between two samples of the thermal record, which takes one every three
+MANY = 20  # findings of one sort
+
+
+def findings(capture: Capture) -> list[str]:
+    sorts: Iterable[Iterator[str]] = (
+        _unreadable(capture),
+        _marks(capture),
+        _identity(capture),
+        *(_series(capture, series) for series in capture.series),
+        *(_thermal(capture, record) for record in capture.records),
+        _empty(capture),
+    )
+    return [finding for sort in sorts for finding in _some(list(sort))]
+
+
+def _some(found: list[str]) -> list[str]:
+    if len(found) <= MANY:
+        return found
+    rest = found[MANY:]
+    return found[:MANY] + [f"And {len(rest)} more of the same sort."]
+
+
+def _unreadable(capture: Capture) -> Iterator[str]:
+    for path, problem in capture.unreadable:
+        yield f"{shown(path)} {problem}."
+
+
+def _marks(capture: Capture) -> Iterator[str]:
+    for name in capture.neighbours:
+        yield f"{shown(name)} beside it is marked as current, too: only the newest should be."
+    if capture.begun is None:
+        yield "Its name is not that of a log directory, so it is not known when it was begun."
+
+
+def _identity(capture: Capture) -> Iterator[str]:
+    if not capture.properties:
+        yield "There are no properties in getprop.txt, so nothing is known of the switches."
+    if capture.version is None:
+        yield "versionNumber is missing."
+        return
+    version = version_text(capture.version)
+    told = capture.properties.get("ro.build.ota.versionname", "")
+    if len(capture.version) != VERSION_FIELD:
+        size = counted(len(capture.version), "byte")
+        yield f"versionNumber has {size} instead of {VERSION_FIELD}."
+    elif capture.properties and version != told:
+        yield (
+            f"versionNumber says “{shown(version)}”, the property ro.build.ota.versionname "
+            f"“{shown(told)}”."
+        )
+
+
+def _series(capture: Capture, series: Series) -> Iterator[str]:
+    name = series.recorder.name
+    if series.switched_on and not series.files:
+        switch = next(s for s in series.recorder.switches if capture.properties.get(s) == "yes")
+        yield f"{name} does not exist although {switch} is yes."
+    unread = any(file.entry.problem for file in series.files)
+    if series.files and not (series.size or unread or series.recorder.may_be_empty):
+        yield f"{name} is empty: its recorder wrote nothing."
+    if series.missing:
+        names = ", ".join(series.missing[:4])
+        more = f" and {len(series.missing) - 4} more" if len(series.missing) > 4 else ""
+        verb = "is" if len(series.missing) == 1 else "are"
+        yield f"{names}{more} {verb} missing from the series of {name}."
+    for file in series.files:
+        problem = _file_problem(series, file)
+        if problem:
+            yield f"{shown(file.entry.path)} {problem}."
+    yield from _silences(capture, series)
+
+
+def _file_problem(series: Series, file: LogFile) -> str:
+    if file.entry.problem:
+        return ""
+    if file.entry.size == 0:
+        return "is empty" if series.size else ""
+    if series.recorder.ring:
+        return file.ending if file.track else "holds no packet"
+    # The daemon's own readers end a file wherever its size is reached, so the newest counts.
+    newest = file is series.files[-1]
+    return file.ending if newest and series.recorder.whole_lines else ""
+
+
+def _silences(capture: Capture, series: Series) -> Iterator[str]:
+    begin, end = capture.begun or series.first, capture.end
+    if begin is None or end is None or series.recorder.once:
+        return
+    limit = series.recorder.quiet or max(SETTLED, (end - begin) / 2)
+    name = series.recorder.name
+    for step in series.steps:
+        # What the device still held from before is not the capture's to answer for.
+        silence = Step(max(step.before, begin), step.after)
+        times = _times(capture, step)
+        if step.after <= begin:
+            continue
+        if step.length < -STEP_BACK:
+            yield f"{name}: the clock goes back by {duration_text(-step.length)}, {times}."
+        elif step.length > DAY:
+            yield f"{name}: the clock jumps, {times}."
+        elif silence.length > limit:
+            length = duration_text(silence.length)
+            yield f"{name} is silent for {length}, {_times(capture, silence)}."
+    if series.last is not None and end - max(series.last, begin) > limit:
+        time, before = clock_text(series.last, capture.begun), duration_text(end - series.last)
+        yield f"{name} ends at {time}, {before} before the last of the other recordings."
+
+
+def _times(capture: Capture, step: Step) -> str:
+    before, after = (clock_text(time, capture.begun) for time in (step.before, step.after))
+    return f"from {before} to {after}"
+
+
+def _thermal(capture: Capture, record: Record) -> Iterator[str]:
+    name = f"The thermal record {shown(record.entry.name)}"
+    samples = len(record.times)
+    if record.ending:
+        yield f"{name} {record.ending}."
+    if record.spoiled:
+        yield f"{name} holds {counted(record.spoiled, 'line')} that no sampler wrote."
+    for source in record.sources:
+        if 0 < source.missing < samples:
+            why = "" if source.zone is not None else ", as of a core that is off"
+            yield f"{name} lacks {source.name} in {source.missing} of {samples} samples{why}."
+    for step in map(Step, record.times, record.times[1:]):
+        if abs(step.length) > PAUSE:
+            verb = "pauses for" if step.length > 0 else "goes back by"
+            length = duration_text(abs(step.length))
+            yield f"{name} {verb} {length}, {_times(capture, step)}."
+
+
+def _empty(capture: Capture) -> Iterator[str]:
+    known = {file.entry.path for series in capture.series for file in series.files}
+    for entry in capture.entries:
+        if entry.size or entry.problem or entry.path in known or entry.path in MARKERS:
+            continue
+        # Nothing may have been in a log of the past when it was copied.
+        if entry.path.split("/")[0] not in LOGS:
+            yield f"{shown(entry.path)} is empty: its source could not be read."

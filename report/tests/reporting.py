@@ -1,0 +1,90 @@
+"""Runs corvex-report, and reads its page as a person does: by what is written in it."""
+
+import os
+import shutil
+import subprocess
+import tempfile
+import unittest
+from html.parser import HTMLParser
+from pathlib import Path
+
+from fixture import make_capture
+
+PROGRAM = Path(__file__).parent.parent / "corvex-report"
+NOBODY = 65534
+
+
+class Page(HTMLParser):
+    """The texts of a page: what is odd, the cells of each table row, and all of it."""
+
+    def __init__(self, html: str) -> None:
+        super().__init__()
+        self.html = html
+        self.tags: list[str] = []
+        self.odd: list[str] = []
+        self.rows: list[list[str]] = []
+        self.text = ""
+        self._target: list[str] | None = None
+        self.feed(html)
+
+    def handle_starttag(self, tag: str, attrs: list[tuple[str, str | None]]) -> None:
+        self.tags.append(tag)
+        if tag == "tr":
+            self.rows.append([])
+        if tag in ("td", "th", "li"):
+            self._target = self.odd if tag == "li" else self.rows[-1]
+            self._target.append("")
+
+    def handle_endtag(self, tag: str) -> None:
+        if tag in ("td", "th", "li"):
+            self._target = None
+
+    def handle_data(self, data: str) -> None:
+        if self.tags[-1:] != ["style"]:
+            self.text += data
+        if self._target is not None:
+            self._target[-1] += data
+
+    def row(self, name: str) -> list[str]:
+        """The cells of the time line's row of that name, without the bars."""
+        found = [row for row in self.rows if len(row) == 5 and row[0].startswith(name)]
+        return [name, *found[0][2:]]
+
+
+def run(
+    *arguments: str | Path, as_user: bool = False, cwd: Path | None = None
+) -> "subprocess.CompletedProcess[str]":
+    """As a user who may not read everything, when asked for and when we are root."""
+    as_nobody = ["setpriv", f"--reuid={NOBODY}", f"--regid={NOBODY}", "--clear-groups"]
+    return subprocess.run(
+        [*(as_nobody if as_user and os.geteuid() == 0 else []), PROGRAM, *arguments],
+        capture_output=True,
+        text=True,
+        errors="surrogateescape",
+        cwd=cwd,
+        timeout=60,
+    )
+
+
+class ReportTest(unittest.TestCase):
+    """Each test has a fresh capture, alone in its directory."""
+
+    def setUp(self) -> None:
+        self.directory = Path(tempfile.mkdtemp(prefix="corvex-report-"))
+        self.addCleanup(shutil.rmtree, self.directory)
+        self.parent = self.directory / "pulled"
+        self.capture = make_capture(self.parent)
+
+    def assert_says(self, page: Page, *texts: str) -> None:
+        for text in texts:
+            self.assertTrue(text in page.text, f"the page does not say: {text}")
+
+    def report(self, as_user: bool = False) -> Page:
+        output = self.directory / "page" / "page.html"
+        output.parent.mkdir(exist_ok=True)
+        if as_user:
+            for path in (self.directory, self.parent, output.parent):
+                path.chmod(0o777)
+        done = run(self.capture, "-o", output, as_user=as_user)
+        self.assertEqual((done.returncode, done.stderr), (0, ""), done.stderr)
+        return Page(output.read_text("utf-8"))

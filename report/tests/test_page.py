@@ -1,0 +1,138 @@
+"""The page in a browser: nothing overflows, nothing is fetched, everything can be seen."""
+
+import os
+import shutil
+import unittest
+from pathlib import Path
+from typing import Any, ClassVar
+
+from fixture import BEGUN, LENGTH, RING, logcat, packets, put, sample, spread
+from reporting import ReportTest
+
+try:
+    from browser import Browser
+
+    MISSING = "" if shutil.which("chromedriver") else "chromium-driver is not installed"
+except ImportError as error:
+    MISSING = str(error)
+
+PICTURES = Path(os.environ.get("CORVEX_REPORT_PICTURES", "/tmp/corvex-report-pictures"))
+WIDTHS = (360, 1280)
+READABLE = 4.5  # contrast of text
+VISIBLE = 3.0  # contrast of what is drawn
+
+# The least contrast of any text, or of what is drawn, with the paper.
+CONTRAST = """
+const luminance = text => {
+  const parts = text.match(/[\\d.]+/g).slice(0, 3).map(c => c / 255)
+    .map(c => c <= 0.03928 ? c / 12.92 : ((c + 0.055) / 1.055) ** 2.4);
+  return 0.2126 * parts[0] + 0.7152 * parts[1] + 0.0722 * parts[2];
+};
+const paper = getComputedStyle(document.body).backgroundColor;
+const contrast = colour => {
+  const [dark, light] = [luminance(paper), luminance(colour)].sort((a, b) => a - b);
+  return (light + 0.05) / (dark + 0.05);
+};
+const texts = [...document.querySelectorAll('body *')].filter(e =>
+  [...e.childNodes].some(n => n.nodeType === 3 && n.data.trim()) && e.tagName !== 'title');
+const colours = texts.map(e => getComputedStyle(e)[e.namespaceURI.endsWith('svg') ? 'fill' : 'color']);
+const drawn = [...document.querySelectorAll('.bar, .mark')].map(e => getComputedStyle(e).fill)
+  .concat([...document.querySelectorAll('.trace')].map(e => getComputedStyle(e).stroke));
+return {paper, text: Math.min(...colours.map(contrast)), drawn: Math.min(...drawn.map(contrast))};
+"""
+
+# The marks of each chart that cannot be seen in it, and how many there are in all.
+MARKS = """
+const hidden = [];
+let count = 0;
+for (const chart of document.querySelectorAll('svg[role=img]')) {
+  const frame = chart.getBoundingClientRect();
+  for (const mark of chart.querySelectorAll('.bar, .mark, .trace')) {
+    const box = mark.getBoundingClientRect();
+    const inside = box.left >= frame.left - 5 && box.right <= frame.right + 5
+      && box.top >= frame.top - 5 && box.bottom <= frame.bottom + 5;
+    count += 1;
+    if (!inside || box.width + box.height < 2) hidden.push(mark.outerHTML.slice(0, 120));
+  }
+}
+return {hidden, count};
+"""
+
+
+@unittest.skipIf(MISSING, MISSING)
+class PageTest(ReportTest):
+    browser: ClassVar[Any]
+
+    @classmethod
+    def setUpClass(cls) -> None:
+        cls.browser = Browser()
+        cls.addClassCleanup(cls.browser.close)
+
+    def spoil(self) -> None:
+        """A capture with something to tell."""
+        end = BEGUN + LENGTH
+        put(self.capture / "android.log.01", logcat(BEGUN + 200, BEGUN + 255, 0.25, "init"), end)
+        put(self.capture / "android.log", logcat(BEGUN + 580, end, 0.25, "init"), end)
+        put(self.capture / RING[2], packets(BEGUN + 430, BEGUN + 595, 0.3)[:-40], BEGUN + 595)
+        (self.capture / "event.log").unlink()
+        record = [
+            sample(t, ("pa_therm0",) if i % 9 == 5 else ())
+            for i, t in enumerate(spread(BEGUN, end, 3))
+        ]
+        put(self.capture / "kv_tsen_data/20261123_03140", "".join(record).encode(), end)
+        (self.parent / "KVBR_1--2026-11-22-22-04-11_current").mkdir()
+        put(self.capture / "dropbox" / ("long_" * 40), b"x", BEGUN + 9)
+
+    def page(self) -> Path:
+        self.report()
+        return self.directory / "page" / "page.html"
+
+    def test_layout_and_visibility(self) -> None:
+        for name in ("healthy", "odd"):
+            if name == "odd":
+                self.spoil()
+            page = self.page()
+            for width in WIDTHS:
+                for dark in (False, True):
+                    with self.subTest(name=name, width=width, dark=dark):
+                        self.check(page, width, dark)
+                        scheme = "dark" if dark else "light"
+                        self.browser.save(PICTURES / f"{name}-{width}-{scheme}.png")
+
+    def check(self, page: Path, width: int, dark: bool) -> None:
+        self.browser.open(page, width, dark)
+        self.assertEqual(self.browser.complaints(), [])
+        self.assertEqual(self.browser.requests(), [page.as_uri()])
+        inner, whole = self.browser.run("return [innerWidth, document.documentElement.scrollWidth]")
+        self.assertEqual((inner, whole), (width, width))
+        contrast = self.browser.run(CONTRAST)
+        self.assertEqual(sum(map(int, contrast["paper"][4:-1].split(","))) < 384, dark)
+        self.assertGreaterEqual(contrast["text"], READABLE)
+        self.assertGreaterEqual(contrast["drawn"], VISIBLE)
+        marks = self.browser.run(MARKS)
+        self.assertEqual(marks["hidden"], [])
+        self.assertGreater(marks["count"], 50)
+
+    def test_unfolded_and_hostile(self) -> None:
+        put(
+            self.capture / "anr" / "<svg onload=alert(1)>" / ("w" * 250),
+            b"Cmd line: " + b"m" * 99,
+            BEGUN,
+        )
+        for number in range(30):
+            put(self.capture / "dropbox" / f"tag_{number}@1795386830{number:03}.txt", b"x", BEGUN)
+        page = self.page()
+        for width in WIDTHS:
+            self.browser.open(page, width)
+            self.browser.run("document.querySelectorAll('details').forEach(d => d.open = true)")
+            self.assertEqual(self.browser.run("return document.documentElement.scrollWidth"), width)
+            self.assertEqual(self.browser.complaints(), [])
+            self.assertEqual(
+                self.browser.run("return document.querySelectorAll('[onload]').length"), 0
+            )
+
+    def test_picture_for_the_readme(self) -> None:
+        self.spoil()
+        self.browser.open(self.page(), 1120)
+        self.browser.save(PICTURES / "report.png", 980)
+        self.assertLess((PICTURES / "report.png").stat().st_size, 200 * 1024)
