@@ -30,8 +30,8 @@ DESCRIBED = 4096  # bytes
 MARKERS = ("fileAfter911", "fileBefore911")
 OWN = ("getprop.txt", "versionNumber")
 
-STAMP = re.compile(r"(\d{4})-(\d\d)-(\d\d)-(\d\d)-(\d\d)-(\d\d)(?!\d)")
-MILLISECONDS = re.compile(r"@(\d{12,13})(?!\d)")
+STAMP = re.compile(r"\d{4}(-\d\d){5}(?!\d)", re.ASCII)
+MILLISECONDS = re.compile(r"@(\d{12,13})(?!\d)", re.ASCII)
 CRASH = re.compile(r"signal \d+ \((SIG\w+)\)")
 PROCESS = re.compile(r">>> (.{1,100}?) <<<")
 COMMAND = re.compile(r"^(?:Cmd line|Process): (.{1,100})$", re.MULTILINE)
@@ -45,7 +45,6 @@ class Item:
     entries: list[Entry] = field(default_factory=list)
     first: float | None = None
     last: float | None = None
-    time_source: str = ""
     about: str = ""
 
     @property
@@ -65,11 +64,11 @@ class Kind:
 
 def stamp_time(text: str) -> float | None:
     stamp = STAMP.search(text)
-    parts = [int(part) for part in stamp.groups()] if stamp else []
     try:
-        return datetime(*parts, tzinfo=timezone.utc).timestamp() if parts else None  # type: ignore[misc,arg-type]
+        time = datetime.strptime(stamp[0], "%Y-%m-%d-%H-%M-%S") if stamp else None
     except ValueError:
         return None
+    return time.replace(tzinfo=timezone.utc).timestamp() if time else None
 
 
 def name_time(name: str, clock: Clock) -> float | None:
@@ -115,16 +114,13 @@ def _set_times(item: Item, tracks: dict[str, Track], clock: Clock) -> None:
     time = name_time(item.name, clock)
     if time is not None:
         item.first = item.last = time
-        item.time_source = "name"
         return
     track = tracks.get(item.entries[0].path) if len(item.entries) == 1 else None
     if track:
         item.first, item.last = (clock.local(track, t) for t in (track.first, track.last))
-        item.time_source = "its lines"
     if item.first is None:
         written = [time for entry in item.entries if (time := clock.written(entry)) is not None]
         item.first = item.last = max(written, default=None)
-        item.time_source = "time of the file" if written else ""
 
 
 def _about(directory: str, item: Item, title: str) -> str:

@@ -71,7 +71,7 @@ class Capture:
 
     @property
     def end(self) -> float | None:
-        """The last time that a recorder has written down."""
+        """The last time that a recorder has written down. The thermal record has an end of its own,
+        by a command of its own."""
         lasts = [series.last for series in self.series if not series.recorder.once]
-        lasts += [record.times[-1] for record in self.records if record.times]
         return max((last for last in lasts if last is not None), default=None)

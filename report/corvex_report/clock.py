@@ -19,8 +19,9 @@ WIDEST = 14 * 3600
 
 # Lines in which a kernel tells the time of day beside its own.
 KERNEL_TIME = re.compile(
-    rb"^(?:\d+,\d+,(?P<us>\d{1,17}),[^;\n]*;|.*?\[ *(?P<s>\d{1,10}\.\d{1,9})\] ?)"
-    rb".*?(?:suspend|setting system clock).*?(\d{4}-\d\d-\d\d)[ T](\d\d:\d\d:\d\d)",
+    rb"^(?:\d+,\d+,(?P<us>\d{1,17}),[^;\n]*;|(?:<\d+>)?\[ *(?P<s>\d{1,10}\.\d{1,9})\] )"
+    rb"[^\n]{0,80}?(?:suspend|setting system clock)"
+    rb"[^\n]{0,80}?(\d{4}-\d\d-\d\d)[ T](\d\d:\d\d:\d\d)",
     re.MULTILINE,
 )
 

@@ -2,7 +2,7 @@
 
 from collections.abc import Iterable, Iterator
 
-from .artefacts import LOGS, MARKERS
+from .artefacts import KINDS, LOGS, MARKERS, OWN
 from .capture import Capture, LogFile, Series
 from .line_formats import DAY
 from .properties import VERSION_FIELD, version_text
@@ -145,9 +145,12 @@ def _thermal(capture: Capture, record: Record) -> Iterator[str]:
 
 def _empty(capture: Capture) -> Iterator[str]:
     known = {file.entry.path for series in capture.series for file in series.files}
+    known.update(MARKERS, OWN)
     for entry in capture.entries:
-        if entry.size or entry.problem or entry.path in known or entry.path in MARKERS:
+        if entry.size or entry.problem or entry.path in known:
             continue
+        top = entry.path.split("/")[0]
         # Nothing may have been in a log of the past when it was copied.
-        if entry.path.split("/")[0] not in LOGS:
-            yield f"{shown(entry.path)} is empty: its source could not be read."
+        if top not in LOGS:
+            why = ": its source was empty, or gone when it was copied" if top in dict(KINDS) else ""
+            yield f"{shown(entry.path)} is empty{why}."

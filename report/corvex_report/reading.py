@@ -15,6 +15,7 @@ from .tracks import Step, last_line_problem, notable, read_track
 
 NAME = re.compile(r".+_(?P<number>\d{1,9})--(?P<time>[\d-]{19})(_current)?")
 MARK = "_current"
+FAR_FUTURE = 2.0**33
 PROPERTIES = 1024 * 1024  # bytes of getprop.txt
 VERSION_FILE = 4096
 SOME = 256 * 1024  # bytes of a kernel log that are searched
@@ -30,7 +31,8 @@ def read_capture(directory: str, progress: Progress) -> Capture:
     match = NAME.fullmatch(name)
     begun = artefacts.stamp_time(match["time"]) if match else None
     entries = scan(directory)
-    near = max((entry.mtime for entry in entries), default=0.0) if begun is None else begun
+    written = max((entry.mtime for entry in entries), default=0.0)
+    near = min(max(written, 0.0), FAR_FUTURE) if begun is None else begun
     return _Reading(directory, name, entries, near, progress).capture(
         int(match["number"]) if match else None, begun
     )

@@ -3,6 +3,7 @@
 from datetime import datetime, timezone
 
 DAY = 86400
+EARLIEST, LATEST = -6e10, 2.5e11  # seconds; a calendar has no others
 
 
 def shown(name: str) -> str:
@@ -43,6 +44,7 @@ def duration_text(seconds: float) -> str:
 
 def date_time(time: float) -> str:
     """Local time of the device, which this program counts as seconds since 1970, too."""
+    time = min(max(time, EARLIEST), LATEST)
     return datetime.fromtimestamp(time, timezone.utc).strftime("%Y-%m-%d %H:%M:%S")
 
 

@@ -47,6 +47,7 @@ class Timeline:
 def build(capture: Capture) -> Timeline | None:
     times = [time for series in capture.series for time in (series.first, series.last) if time]
     times += [item.first for kind in capture.kinds for item in kind.items if item.first]
+    times += [time for record in capture.records for time in record.times[-1:]]
     if not times:
         return None
     begin = capture.begun or min(times)

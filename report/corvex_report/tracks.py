@@ -82,8 +82,8 @@ def _sample(reader: Reader, found: Format, calendar: Calendar) -> Track | None:
         points = [(place, times_at(place, found.block)) for place in places]
         known = [(place, times[0]) for place, times in points if times]
         pairs = list(zip(known, known[1:]))
-        if not pairs:
-            break
+        if len(pairs) < 2:
+            return track  # there are too few times in it to look between
         # The way back first: a clock that was set explains a silence, not the other way round.
         back = [pair for pair in pairs if pair[1][1] - pair[0][1] < -STEP_BACK]
         (low, _), (high, _) = (back or [max(pairs, key=lambda pair: pair[1][1] - pair[0][1])])[0]

@@ -3,6 +3,7 @@
 import os
 import random
 import shutil
+import time
 import unittest
 from collections.abc import Callable
 from pathlib import Path
@@ -61,6 +62,13 @@ class HealthyTest(ReportTest):
         self.assertEqual(page.odd, [])
         self.assert_says(page, "Switched off: radio.log.")
         self.assert_says(page, "No thermal record")
+
+    def test_a_thermal_record_goes_on_after_the_capture(self) -> None:
+        lines = "".join(sample(time) for time in spread(BEGUN, BEGUN + 3 * LENGTH, 3))
+        put(self.capture / RECORD, lines.encode(), BEGUN + 3 * LENGTH)
+        page = self.report()
+        self.assertEqual(page.odd, [])
+        self.assertEqual(page.row(RECORD)[1], "00:31:30 – 01:01:30")
 
     def test_clocks(self) -> None:
         """Files that have lost their times; a named zone; a kernel that tells the time; no anchor."""
@@ -207,7 +215,7 @@ class OddTest(ReportTest):
         )
         self.odd(
             lambda: self.write("dropbox/x", b""),
-            "dropbox/x is empty: its source could not be read.",
+            "dropbox/x is empty: its source was empty, or gone when it was copied.",
         )
         self.odd(
             lambda: (self.capture / "getprop.txt").unlink(),
@@ -250,6 +258,21 @@ class HostileTest(ReportTest):
         self.assertNotIn("\u202e", page.html)
         for text in (evil, "a\\x0ab", "\\u202egnp.exe", "\\xff\\xfe", "Corvex </style><script>"):
             self.assert_says(page, text)
+
+    def test_what_could_take_for_ever(self) -> None:
+        """What a search that knows no limits would get lost in."""
+        noise = random.Random(8)
+        put(self.capture / "kernel.log", b"[    1.0] " + b"suspend 2026-11-23 " * 30000, END)
+        put(self.capture / "tz.log", b"1" * 2**21 + b"\n" + b"[" * 2**21, END)
+        lines = logcat(BEGUN, BEGUN + 9, 1, "init") + b"x" * 2**21 + logcat(END, END, 1, "init")
+        put(self.capture / "android.log", lines, END)
+        put(self.capture / "qsee.log", b"[1.5] x\n" + b"[9999999999.5] x\n", 2**40)
+        put(self.capture / "getprop.txt", b"[" + b"]: [" * 2**19, BEGUN)
+        put(self.capture / "tcpdump0", packets(BEGUN, BEGUN + 9, 1) + noise.randbytes(2**24), END)
+        put(self.capture / "tombstones/x", b">>> " * 2**20, END)
+        start = time.monotonic()
+        self.report()
+        self.assertLess(time.monotonic() - start, 10)
 
     def test_any_bytes_in_any_file(self) -> None:
         noise = random.Random(8)
