@@ -171,12 +171,12 @@ int run_watch(char** arguments) {
   if (inotify_add_watch(inotify, arguments[0], IN_CLOSE_WRITE | IN_MOVED_TO) == -1) return 1;
   puts("ready");
   fflush(stdout);
-  alignas(struct inotify_event) static char records[32768];
+  static char records[32768];
   for (ssize_t size; (size = read(inotify, records, sizeof records)) > 0;) {
-    for (char* next = records; next < records + size;) {
-      auto* event = reinterpret_cast<struct inotify_event*>(next);
-      if (event->len > 0) collect(arguments[0], event->name, arguments[1]);
-      next += sizeof *event + event->len;
+    struct inotify_event event;
+    for (char* next = records; next < records + size; next += sizeof event + event.len) {
+      memcpy(&event, next, sizeof event);
+      if (event.len > 0) collect(arguments[0], next + sizeof event, arguments[1]);
     }
   }
   return 1;
