@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # check.sh PACKAGES_DIR: tries out the Debian packages in it, unpacked where no build and no source is:
-# what is in them, what they need, the completion in real shells, and a capture on a device.
+# what is in them, what they need, the completion in real shells, a capture on a device and a page of it.
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd)
@@ -26,7 +26,7 @@ unpack() {
     done
     check "files outside /usr" "" "$(find "$tree" -mindepth 1 -maxdepth 1 ! -name usr)"
     for file in bin/corvexctl bin/corvex-device \
-        share/man/man{1/corvexctl.1,1/corvex-device.1,8/corvexd.8}.gz; do
+        share/man/man{1/corvexctl.1,1/corvex-device.1,1/corvex-report.1,8/corvexd.8}.gz; do
         [ -e "$tree/usr/$file" ] || fail "no /usr/$file"
     done
     gzip -t "$tree"/usr/share/man/*/*
@@ -58,8 +58,15 @@ capture() {
     check "the line that was logged, in android.log" 1 "$lines"
 }
 
+report() {
+    local capture=("$root"/data/corvex/KVBR_1--*)
+    "$tree/usr/bin/corvex-report" "${capture[0]}" -o "$tree/page.html" >/dev/null
+    grep -q "${capture[0]##*/}" "$tree/page.html" || fail "corvex-report made a page of something else"
+}
+
 unpack
 check_needs
 PATH=$tree/usr/bin:$PATH "$here/check_completion.py" "$tree/usr/share"
 capture
+report
 echo "packages: complete, and a device with them captures"
