@@ -11,7 +11,7 @@ LISTED = {
     "client/command_words.cpp": ROW,
     "docs/man/corvexctl.1.md": r"(?:^|(?<=, ))\*\*([A-Z_]+)\*\*(?=,|$)",
     "docs/man/corvexd.8.md": r"(?:^|(?<=, ))\*\*([A-Z_]+)\*\*(?=,|$)",
-    "README.md": r"(?<=^\| )`([A-Z_]+)`|(?<=, )`([A-Z_]+)`(?= \|)",
+    "docs/architecture.md": r"(?<=^\| )`([A-Z_]+)`|(?<=, )`([A-Z_]+)`(?= \|)",
 }
 
 
