@@ -31,8 +31,10 @@ def read(path):
 
 def cmake_sources(path, target):
     text = re.search(r"add_(?:library|executable)\(%s\s([^)]*)\)" % target, read(path)).group(1)
-    return {os.path.normpath(os.path.join(os.path.dirname(path), name))
-            for name in re.findall(r"[\w./]+\.cpp", text)}
+    return {
+        os.path.normpath(os.path.join(os.path.dirname(path), name))
+        for name in re.findall(r"[\w./]+\.cpp", text)
+    }
 
 
 def soong_sources():
@@ -93,13 +95,17 @@ def socket_problems():
     code = read("simulator/init/services.cpp")
     name, kind, mode = re.search(r'\{"(corvexd)", SOCK_(\w+), (\d+),', code).groups()
     owner = re.search(r"chown\(path\.c_str\(\), (\w+), (\w+)\)", code).groups()
-    users = [USERS[re.sub(r"^kSystem$", re.search(r"kSystem = (\d+)", code).group(1), number)]
-             for number in owner]
+    users = [
+        USERS[re.sub(r"^kSystem$", re.search(r"kSystem = (\d+)", code).group(1), number)]
+        for number in owner
+    ]
     simulated = ["socket", name, kind.lower(), mode] + users
     on_device = re.search(r"^ +(socket .*)$", read("packaging/corvexd.rc"), re.M).group(1).split()
     if on_device != simulated:
         yield 'packaging/corvexd.rc: "%s", but the simulator has "%s"' % (
-            " ".join(on_device), " ".join(simulated))
+            " ".join(on_device),
+            " ".join(simulated),
+        )
 
 
 def main():

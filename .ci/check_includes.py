@@ -70,7 +70,7 @@ def find_cycle(includes):
 
     def walk(path, trail):
         if path in trail:
-            return trail[trail.index(path):] + [path]
+            return trail[trail.index(path) :] + [path]
         if path in done:
             return []
         for target in includes.get(path, []):
@@ -90,8 +90,10 @@ def find_cycle(includes):
 def main():
     os.chdir(os.path.join(os.path.dirname(os.path.abspath(__file__)), ".."))
     includes = read_includes()
-    problems = ["%s: has no row in .ci/check_includes.py" % name
-                for name in sorted({room(path) for path in includes} - set(ALLOWED) - set(OUTSIDE))]
+    problems = [
+        "%s: has no row in .ci/check_includes.py" % name
+        for name in sorted({room(path) for path in includes} - set(ALLOWED) - set(OUTSIDE))
+    ]
     if not problems:
         for path, targets in includes.items():
             for target in targets:
