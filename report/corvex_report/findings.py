@@ -93,7 +93,7 @@ def _file_problem(series: Series, file: LogFile) -> str:
         return file.ending if file.track else "holds no packet"
     # The daemon's own readers end a file wherever its size is reached, so the newest counts.
     newest = file is series.files[-1]
-    return file.ending if newest and series.recorder.whole_lines else ""
+    return file.ending if newest and not series.recorder.once else ""
 
 
 def _silences(capture: Capture, series: Series) -> Iterator[str]:

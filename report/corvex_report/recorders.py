@@ -11,12 +11,9 @@ class Recorder:
     name: str  # of its file
     title: str
     switches: tuple[str, ...]
-    count: str = ""  # the property that says how many rotated files logcat keeps
-    default_count: int = 0
     quiet: float = 0.0  # seconds without a line that are odd; 0: half the capture
     ring: bool = False  # numbers its files in a ring; the others shift theirs, the oldest is last
     may_be_empty: bool = False
-    whole_lines: bool = True
     once: bool = False  # copied at the start, and its lines have no date
 
     def number(self, name: str) -> int | None:
@@ -28,30 +25,20 @@ class Recorder:
 
 RECORDERS = (
     # The daemon itself takes an android.log that stands still for five minutes for stuck.
-    Recorder(
-        "android.log",
-        "Android",
-        ("persist.sys.main", "persist.sys.system"),
-        "persist.sys.android.lognum",
-        30,
-        quiet=300.0,
-    ),
-    Recorder("radio.log", "Radio", ("persist.sys.radio",), "persist.sys.radio.lognum", 5),
-    Recorder("event.log", "Events", ("persist.sys.event",), "persist.sys.event.lognum", 5),
-    Recorder("kernel.log", "Kernel", ("persist.sys.kernel",), "persist.sys.kernel.lognum", 5),
+    Recorder("android.log", "Android", ("persist.sys.main", "persist.sys.system"), quiet=300.0),
+    Recorder("radio.log", "Radio", ("persist.sys.radio",)),
+    Recorder("event.log", "Events", ("persist.sys.event",)),
+    Recorder("kernel.log", "Kernel", ("persist.sys.kernel",)),
     Recorder("tcpdump", "Packets", ("persist.sys.tcpdump",), ring=True),
     Recorder("qsee.log", "Secure world, applications", ("persist.sys.qsee",)),
     Recorder("tz.log", "Secure world, kernel", ("persist.sys.tz",)),
-    Recorder(
-        "bootloader.log", "Bootloader", ("persist.sys.bootloader",), whole_lines=False, once=True
-    ),
+    Recorder("bootloader.log", "Bootloader", ("persist.sys.bootloader",), once=True),
     # Its area is erased once read: only the first capture after a start of the device finds text.
     Recorder(
         "pre_bootloader.log",
         "Pre-bootloader",
         ("persist.sys.pre_bootloader",),
         may_be_empty=True,
-        whole_lines=False,
         once=True,
     ),
 )

@@ -11,6 +11,7 @@ from .thermal import Record
 from .tracks import Step
 
 MARKS = 300  # of one row
+LATE = 60.0  # seconds after which a log has lost its beginning
 NARROWEST = 0.5  # percent; a silence that can be seen
 
 
@@ -104,8 +105,8 @@ def _silence(row: Row, scale: TimeScale, step: Step, begun: float | None) -> Non
 def _notes(capture: Capture, series: Series) -> Iterator[str]:
     if series.switched_on is False:
         yield "switched off when the properties were written down"
-    if _full(capture, series):
-        yield "has as many files as are kept: older lines are gone"
+    if _beheaded(capture, series):
+        yield "begins after the capture: older lines are gone"
     tracks = [file.track for file in series.files if file.track]
     if any(file.first is not None for file in series.files):
         return
@@ -118,15 +119,13 @@ def _notes(capture: Capture, series: Series) -> Iterator[str]:
         yield "bears no times"
 
 
-def _full(capture: Capture, series: Series) -> bool:
-    """Only logcat drops old files; the daemon's own reader of the kernel log keeps all."""
-    recorder = series.recorder
-    if not recorder.count or (
-        recorder.name == "kernel.log" and capture.properties.get("persist.sys.kernel.kmsg") == "yes"
-    ):
+def _beheaded(capture: Capture, series: Series) -> bool:
+    """logcat begins with what the device still holds from before, and drops its oldest file."""
+    track = series.files[0].track
+    if capture.begun is None or len(series.files) < 2 or track is None:
         return False
-    count = capture.properties.get(recorder.count) or str(recorder.default_count)
-    return len(series.files) > 1 and str(len(series.files) - 1) == count
+    dated = not (track.format.relative or track.format.utc)
+    return dated and track.first > capture.begun + LATE
 
 
 def _record_row(capture: Capture, record: Record, scale: TimeScale) -> Row:
