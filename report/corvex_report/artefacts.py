@@ -24,8 +24,10 @@ KINDS = (
     ("recovery", "Recovery"),
     ("kmsg", "Kernel logs of earlier boots"),
 )
-REPORTS, OTHER = "Bug reports", "Other files"
+EARLIER, REPORTS, OTHER = "From before the capture", "Bug reports", "Other files"
 LOGS = ("boot_log", "log_before_initial", "recovery", "kmsg")  # their lines have times
+# Copied when the capture begins, or later: the times of their files are those of the copies.
+COPIED = (EARLIER, *(title for name, title in KINDS if name in LOGS))
 DESCRIBED = 4096  # bytes
 MARKERS = ("fileAfter911", "fileBefore911")
 OWN = ("getprop.txt", "versionNumber")
@@ -91,10 +93,10 @@ def collect(
         item = grouped.setdefault(title, {}).setdefault(name, Item(name))
         item.entries.append(entry)
     kinds = []
-    for title in [*titles.values(), REPORTS, OTHER]:
+    for title in [*titles.values(), EARLIER, REPORTS, OTHER]:
         items = list(grouped.get(title, {}).values())
         for item in items:
-            _set_times(item, tracks, clock)
+            _set_times(item, title, tracks, clock)
             item.about = _about(directory, item, title)
         items.sort(key=lambda item: (item.first is None, item.first or 0.0))
         if items:
@@ -105,28 +107,36 @@ def collect(
 def _place(entry: Entry, titles: dict[str, str]) -> tuple[str, str]:
     """The kind of an entry, and the item that it belongs to."""
     top, _, rest = entry.path.partition(os.sep)
+    if top == "anr" and os.sep not in rest:  # those of the capture have directories of their own
+        return EARLIER, rest
     if not rest:
         return (REPORTS if top.endswith("-BUGREPORT.log") else OTHER), top
     return (titles[top], rest.split(os.sep)[0]) if top in titles else (OTHER, top)
 
 
-def _set_times(item: Item, tracks: dict[str, Track], clock: Clock) -> None:
+def _set_times(item: Item, title: str, tracks: dict[str, Track], clock: Clock) -> None:
     time = name_time(item.name, clock)
     if time is not None:
         item.first = item.last = time
         return
-    track = tracks.get(item.entries[0].path) if len(item.entries) == 1 else None
-    if track:
+    path = item.entries[0].path
+    track = tracks.get(path) if len(item.entries) == 1 else None
+    if track and (_this_start(path) or not track.format.relative):
         item.first, item.last = (clock.local(track, t) for t in (track.first, track.last))
-    if item.first is None:
+    if item.first is None and title not in COPIED:
         written = [time for entry in item.entries if (time := clock.written(entry)) is not None]
         item.first = item.last = max(written, default=None)
 
 
+def _this_start(path: str) -> bool:
+    """Whether a copied log counts from this start of the device."""
+    return path.startswith("boot_log" + os.sep) and not path.endswith(".pre")
+
+
 def _about(directory: str, item: Item, title: str) -> str:
-    if title == "Dropbox entries":
-        return item.name.partition("@")[0].replace("_", " ") if "@" in item.name else ""
-    if title not in ("Tombstones", "ANR traces"):
+    if title in ("Dropbox entries", EARLIER) and "@" in item.name:
+        return item.name.partition("@")[0].replace("_", " ")
+    if title not in ("Tombstones", "ANR traces", EARLIER):
         return ""
     for entry in item.entries:
         text = read_piece(directory, entry, DESCRIBED).decode("utf-8", "surrogateescape")

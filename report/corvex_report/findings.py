@@ -12,6 +12,8 @@ from .tracks import STEP_BACK, Step
 
 SETTLED = 300.0  # seconds of silence that no log is blamed for
 PAUSE = 30.0  # seconds between two samples of the thermal record, which takes one every three
+# What a kernel may have nothing to say in, beside each ANR.
+BINDER_STATE = ("transactions", "transaction_log", "state")
 MANY = 20  # findings of one sort
 
 
@@ -132,10 +134,9 @@ def _thermal(capture: Capture, record: Record) -> Iterator[str]:
         yield f"{name} {record.ending}."
     if record.spoiled:
         yield f"{name} holds {counted(record.spoiled, 'line')} that no sampler wrote."
-    for source in record.sources:
-        if 0 < source.missing < samples:
-            why = "" if source.zone is not None else ", as of a core that is off"
-            yield f"{name} lacks {source.name} in {source.missing} of {samples} samples{why}."
+    for zone in record.zones:  # a core that is off has no frequency
+        if 0 < zone.missing < samples:
+            yield f"{name} lacks {zone.name} in {zone.missing} of {samples} samples."
     for step in map(Step, record.times, record.times[1:]):
         if abs(step.length) > PAUSE:
             verb = "pauses for" if step.length > 0 else "goes back by"
@@ -150,6 +151,11 @@ def _empty(capture: Capture) -> Iterator[str]:
         if entry.size or entry.problem or entry.path in known:
             continue
         top = entry.path.split("/")[0]
+        # A lost entry of the dropbox is a name and nothing else.
+        if top in ("dropbox", "anr") and entry.name.endswith(".lost"):
+            continue
+        if top == "anr" and entry.name in BINDER_STATE:
+            continue
         # Nothing may have been in a log of the past when it was copied.
         if top not in LOGS:
             why = ": its source was empty, or gone when it was copied" if top in dict(KINDS) else ""
