@@ -64,7 +64,8 @@ class Reader:
     def __init__(self, directory: str, entry: Entry) -> None:
         flags = os.O_RDONLY | os.O_NOFOLLOW | os.O_NONBLOCK | os.O_CLOEXEC
         self._fd = os.open(os.path.join(directory, entry.path), flags)
-        self.size = os.fstat(self._fd).st_size
+        status = os.fstat(self._fd)
+        self.size, self.mtime = status.st_size, status.st_mtime
 
     def __enter__(self) -> "Reader":
         return self

@@ -4,7 +4,7 @@ import re
 import struct
 from dataclasses import dataclass
 
-from .line_formats import Calendar
+from .line_formats import DAY, Calendar
 
 FILE_HEADER = 24
 PACKET_HEADER = 16
@@ -68,16 +68,24 @@ class PcapFormat:
         return True
 
 
-def _era(order: str, head: bytes) -> "re.Pattern[bytes]":
-    """The upper halves of the seconds of the days after the first packet. Searching for them is how
-    a packet is found in no time where there is none."""
+def _era(order: str, head: bytes, written: float) -> "re.Pattern[bytes]":
+    """The upper halves of the seconds from the first packet to the file's last writing, some days at
+    least and a year at most. Searching for them is how a packet is found in no time where there is
+    none."""
     (seconds,) = struct.unpack_from(order + "I", head.ljust(FILE_HEADER + 4, b"\0"), FILE_HEADER)
-    halves = [struct.pack(order + "H", (seconds // 65536 + i) % 65536) for i in range(8)]
-    return re.compile(b"(?=" + b"|".join(map(re.escape, halves)) + b")", re.DOTALL)
+    span = min(max(written - seconds, 5 * DAY), 366 * DAY)
+    lows: dict[int, list[int]] = {}
+    for half in range(seconds // 65536, int(seconds + span) // 65536 + 2):
+        lows.setdefault(half // 256 % 256, []).append(half % 256)
+    parts = []
+    for high, low in lows.items():
+        byte, any_of = re.escape(bytes([high])), b"[" + re.escape(bytes(low)) + b"]"
+        parts.append(any_of + byte if order == "<" else byte + any_of)
+    return re.compile(b"(?=" + b"|".join(parts) + b")", re.DOTALL)
 
 
-def pcap_format(head: bytes) -> PcapFormat | None:
+def pcap_format(head: bytes, written: float) -> PcapFormat | None:
     magic = MAGICS.get(head[:4])
     if magic is None or len(head) < FILE_HEADER:
         return None
-    return PcapFormat(*magic, _era(magic[0], head))
+    return PcapFormat(*magic, _era(magic[0], head, written))

@@ -47,8 +47,8 @@ def steps_between(times: list[float]) -> list[Step]:
     return [step for step in map(Step, times, times[1:]) if notable(step)]
 
 
-def find_format(head: bytes, calendar: Calendar) -> Format | None:
-    packets = pcap_format(head)
+def find_format(head: bytes, calendar: Calendar, written: float) -> Format | None:
+    packets = pcap_format(head, written)
     if packets:
         return packets
     counts = [(len(line.times(head, calendar, True)), line) for line in LINE_FORMATS]
@@ -58,7 +58,7 @@ def find_format(head: bytes, calendar: Calendar) -> Format | None:
 
 def read_track(reader: Reader, calendar: Calendar) -> Track | None:
     head = reader.read(0, HEAD)
-    found = find_format(head, calendar)
+    found = find_format(head, calendar, reader.mtime)
     if found is None:
         return None
     if reader.size <= max(WHOLE, found.block):
