@@ -79,7 +79,7 @@ def name_time(name: str, clock: Clock) -> float | None:
     if time is not None:
         return time
     since_epoch = MILLISECONDS.search(name)
-    return int(since_epoch[1]) / 1000 + clock.offset if since_epoch else None
+    return clock.from_utc(int(since_epoch[1]) / 1000) if since_epoch else None
 
 
 def collect(
@@ -121,7 +121,7 @@ def _set_times(item: Item, title: str, tracks: dict[str, Track], clock: Clock) -
         return
     path = item.entries[0].path
     track = tracks.get(path) if len(item.entries) == 1 else None
-    if track and (_this_start(path) or not track.format.relative):
+    if track and track.last is not None and (_this_start(path) or not track.format.relative):
         item.first, item.last = (clock.local(track, t) for t in (track.first, track.last))
     if item.first is None and title not in COPIED:
         written = [time for entry in item.entries if (time := clock.written(entry)) is not None]

@@ -16,7 +16,7 @@ class LogFile:
     track: Track | None = None
     first: float | None = None
     last: float | None = None
-    time_source: str = ""
+    time_source: str = ""  # of the last time, or of both
     ending: str = ""  # what is wrong with its end
 
 
@@ -44,7 +44,8 @@ class Series:
 
     @property
     def last(self) -> float | None:
-        return next((file.last for file in reversed(self.files) if file.last is not None), None)
+        newest = next((file for file in reversed(self.files) if file.first is not None), None)
+        return newest.last if newest else None
 
 
 @dataclass
@@ -68,6 +69,12 @@ class Capture:
     @property
     def size(self) -> int:
         return sum(entry.size for entry in self.entries)
+
+    @property
+    def since(self) -> float | None:
+        """When it was begun, or a time by which it was: all recorders wrote."""
+        firsts = [first for series in self.series if (first := series.first) is not None]
+        return max(firsts, default=None) if self.begun is None else self.begun
 
     @property
     def end(self) -> float | None:

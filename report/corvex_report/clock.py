@@ -5,12 +5,14 @@ import re
 import time
 from collections import Counter
 from collections.abc import Sequence
-from dataclasses import dataclass
+from dataclasses import dataclass, replace
 from datetime import datetime, timezone
 from zoneinfo import ZoneInfo
 
 from .files import Entry
-from .tracks import Track
+from .line_formats import DAY
+from .text import EARLIEST, LATEST
+from .tracks import Step, Track
 
 QUARTER = 900  # seconds; every zone is off by a multiple of it
 AT_ONCE = 5.0  # seconds within which a line is written after the time that it bears
@@ -28,80 +30,129 @@ KERNEL_TIME = re.compile(
 
 @dataclass(frozen=True)
 class Clock:
-    offset: float  # of local time from UTC
-    offset_source: str
-    file_times: bool  # whether the files still have the times of the device
-    boot: float | None = None
+    offset: float  # of local time from UTC when the capture began
+    source: str  # of the offset
+    zone: ZoneInfo | None = None  # if known, the offset follows its summer time
+    file_times: bool = False  # whether the files still have the times of the device
+    boot: float | None = None  # in UTC
     boot_source: str = ""
+
+    def from_utc(self, utc: float) -> float:
+        return utc + (self.offset if self.zone is None else _offset_at(self.zone, utc))
 
     def local(self, track: Track, value: float) -> float | None:
         """A time that a track holds."""
         if track.format.relative:
-            return None if self.boot is None else self.boot + value
-        return value + self.offset if track.format.utc else value
+            return None if self.boot is None else self.from_utc(self.boot + value)
+        return self.from_utc(value) if track.format.utc else value
+
+    def steps(self, track: Track) -> list[Step]:
+        """A track's steps in local time."""
+        if not (track.format.relative or track.format.utc):
+            return self.measured(track.steps)
+        steps = []
+        for step in track.steps:
+            before, after = (self.local(track, time) for time in (step.before, step.after))
+            if before is not None and after is not None:
+                steps.append(Step(before, after, step.length))
+        return steps
+
+    def measured(self, steps: list[Step]) -> list[Step]:
+        """Steps between local times, with the seconds that did pass."""
+        return [replace(step, length=self.passed(step.before, step.after)) for step in steps]
+
+    def passed(self, before: float, after: float) -> float:
+        """The seconds between two local times. Where summer time begins or ends these are others
+        than the clock says, and of an hour that comes twice the nearest is meant."""
+        if self.zone is None:
+            return after - before
+        befores, afters = (_as_utc(self.zone, time) for time in (before, after))
+        return min((a - b for a in afters for b in befores), key=abs)
 
     def written(self, entry: Entry) -> float | None:
-        return entry.mtime + self.offset if self.file_times and not entry.problem else None
+        return self.from_utc(entry.mtime) if self.file_times and not entry.problem else None
 
-    def zone(self) -> str:
+    def offset_text(self) -> str:
         minutes = round(self.offset / 60)
         return f"UTC{'-' if minutes < 0 else '+'}{abs(minutes) // 60:02}:{abs(minutes) % 60:02}"
 
 
-Dated = Sequence[tuple[Entry, Track]]
+Dated = Sequence[tuple[Entry, Track, float]]  # with the last time of each
 
 
-def find_clock(tracks: Dated, kernel: bytes, zone: str, near: float) -> Clock:
-    """`kernel` is some of the kernel log."""
-    dated = [(e, t) for e, t in tracks if not t.format.relative and not t.format.utc]
-    offset, source = _offset(tracks, dated, zone, near)
-    agree = sum(abs(t.last - e.mtime - offset) <= AT_ONCE for e, t in dated)
-    clock = Clock(offset, source, agree >= min(ENOUGH, len(dated)))
-    return _with_boot(clock, tracks, kernel)
+def find_clock(
+    tracks: Sequence[tuple[Entry, Track]], kernel: bytes, zone: str, near: float
+) -> Clock:
+    """From what this capture recorded itself; `kernel` is some of the kernel log."""
+    ended = [(e, t, t.last) for e, t in tracks if t.last is not None]
+    dated = [(e, t, last) for e, t, last in ended if not t.format.relative and not t.format.utc]
+    clock = _named_zone(zone, near) or _offset(ended, dated, near)
+    agree = sum(abs(last - clock.from_utc(e.mtime)) <= AT_ONCE for e, _, last in dated)
+    clock = replace(clock, file_times=agree >= min(ENOUGH, len(dated)))
+    return _with_boot(clock, [one for one in ended if one[1].format.relative], kernel, near)
 
 
-def _offset(tracks: Dated, dated: Dated, zone: str, near: float) -> tuple[float, str]:
-    named = _named_offset(zone, near)
-    if named is not None:
-        return named, f"persist.sys.timezone is {zone}"
+def _named_zone(name: str, near: float) -> Clock | None:
+    try:
+        zone = ZoneInfo(name)
+    except (LookupError, ValueError, OSError):
+        return None
+    return Clock(near - _as_utc(zone, near)[0], f"persist.sys.timezone is {name}", zone)
+
+
+def _offset(ended: Dated, dated: Dated, near: float) -> Clock:
     votes: Counter[float] = Counter()
-    for entry, track in dated:
-        ahead = track.last - entry.mtime
+    for entry, _, last in dated:
+        ahead = last - entry.mtime
         offset = _nearest_zone(ahead)
         if abs(ahead - offset) <= AT_ONCE and abs(offset) <= WIDEST:
             votes[offset] += 1
     if votes and votes.most_common(1)[0][1] >= min(ENOUGH, len(dated)):
-        return votes.most_common(1)[0][0], "the logs’ last lines against the times of their files"
-    packets = [track.last for _, track in tracks if track.format.utc]
-    offset = _nearest_zone(max(t.last for _, t in dated) - max(packets)) if packets and dated else 0
-    if packets and dated and abs(offset) <= WIDEST:
-        return offset, "the logs’ last lines against the last packet"
-    return float(time.localtime(near).tm_gmtoff), "this computer’s; the capture does not tell"
+        offset = votes.most_common(1)[0][0]
+        return Clock(offset, "the logs’ last lines against the times of their files")
+    packets = [last for _, track, last in ended if track.format.utc]
+    if packets and dated:
+        offset = _nearest_zone(max(last for _, _, last in dated) - max(packets))
+        if abs(offset) <= WIDEST:
+            return Clock(offset, "the logs’ last lines against the last packet")
+    here = float(time.localtime(near).tm_gmtoff)
+    return Clock(here, "this computer’s; the capture does not tell")
 
 
-def _named_offset(zone: str, near: float) -> float | None:
-    try:
-        local = datetime.fromtimestamp(near, timezone.utc).replace(tzinfo=ZoneInfo(zone))
-    except (LookupError, ValueError, OSError):
-        return None
-    offset = local.utcoffset()
-    return None if offset is None else offset.total_seconds()
+def _offset_at(zone: ZoneInfo, utc: float) -> float:
+    """In seconds."""
+    offset = datetime.fromtimestamp(min(max(utc, EARLIEST), LATEST), zone).utcoffset()
+    return offset.total_seconds() if offset else 0.0
+
+
+def _as_utc(zone: ZoneInfo, local: float) -> list[float]:
+    """All that a local time may be: the hour that summer time ends in comes twice."""
+    naive = datetime.fromtimestamp(min(max(local, EARLIEST), LATEST), timezone.utc)
+    offsets = (naive.replace(tzinfo=zone, fold=fold).utcoffset() for fold in (0, 1))
+    return [local - offset.total_seconds() for offset in offsets if offset is not None]
 
 
 def _nearest_zone(ahead: float) -> float:
     return float(round(ahead / QUARTER) * QUARTER)
 
 
-def _with_boot(clock: Clock, tracks: Dated, kernel: bytes) -> Clock:
-    told = [boot for match in KERNEL_TIME.finditer(kernel) if (boot := _told_boot(match))]
+def _with_boot(clock: Clock, counted: Dated, kernel: bytes, near: float) -> Clock:
+    first = min((track.first for _, track, _ in counted), default=0.0)
+    last = max((last for _, _, last in counted), default=0.0)
+    told = [
+        boot
+        for match in KERNEL_TIME.finditer(kernel)
+        if (boot := _told_boot(match)) is not None
+        # Kernels tell of 1970, too, before the clock is set.
+        and clock.from_utc(boot + first) - DAY <= near <= clock.from_utc(boot + last) + DAY
+    ]
     if told:  # the last: the clock since boot stands still while the device sleeps
-        return _started(clock, told[-1] + clock.offset, "a kernel line that tells the time")
-    counted = [(e, t) for e, t in tracks if t.format.relative]
+        return replace(clock, boot=told[-1], boot_source="a kernel line that tells the time")
     if not counted or not clock.file_times:
         return clock
-    entry, track = max(counted, key=lambda pair: pair[0].mtime)
+    entry, _, last = max(counted, key=lambda one: one[0].mtime)
     source = f"the last line of {entry.name} against the time of the file"
-    return _started(clock, entry.mtime + clock.offset - track.last, source)
+    return replace(clock, boot=entry.mtime - last, boot_source=source)
 
 
 def _told_boot(match: "re.Match[bytes]") -> float | None:
@@ -111,7 +162,3 @@ def _told_boot(match: "re.Match[bytes]") -> float | None:
     except ValueError:
         return None
     return utc.timestamp() - uptime
-
-
-def _started(clock: Clock, boot: float, source: str) -> Clock:
-    return Clock(clock.offset, clock.offset_source, clock.file_times, boot, source)

@@ -6,24 +6,23 @@ from .artefacts import KINDS, LOGS, MARKERS, OWN
 from .capture import Capture, LogFile, Series
 from .line_formats import DAY
 from .properties import VERSION_FIELD, version_text
+from .sleep import SETTLED, Sleep, silences, summary
 from .text import clock_text, counted, duration_text, shown
 from .thermal import Record
-from .tracks import STEP_BACK, Step
+from .tracks import SILENCE, STEP_BACK, Step
 
-SETTLED = 300.0  # seconds of silence that no log is blamed for
-PAUSE = 30.0  # seconds between two samples of the thermal record, which takes one every three
 # What a kernel may have nothing to say in, beside each ANR.
 BINDER_STATE = ("transactions", "transaction_log", "state")
 MANY = 20  # findings of one sort
 
 
-def findings(capture: Capture) -> list[str]:
+def findings(capture: Capture, sleep: Sleep) -> list[str]:
     sorts: Iterable[Iterator[str]] = (
         _unreadable(capture),
         _marks(capture),
         _identity(capture),
-        *(_series(capture, series) for series in capture.series),
-        *(_thermal(capture, record) for record in capture.records),
+        *(_series(capture, series, sleep) for series in capture.series),
+        *(_thermal(capture, record, sleep) for record in capture.records),
         _empty(capture),
     )
     return [finding for sort in sorts for finding in _some(list(sort))]
@@ -44,7 +43,9 @@ def _unreadable(capture: Capture) -> Iterator[str]:
 def _marks(capture: Capture) -> Iterator[str]:
     for name in capture.neighbours:
         yield f"{shown(name)} beside it is marked as current, too: only the newest should be."
-    if capture.begun is None:
+    if capture.begun is None and capture.number is not None:
+        yield "Its name is of 1970: the clock had not been set when it was begun."
+    elif capture.begun is None:
         yield "Its name is not that of a log directory, so it is not known when it was begun."
 
 
@@ -66,7 +67,7 @@ def _identity(capture: Capture) -> Iterator[str]:
         )
 
 
-def _series(capture: Capture, series: Series) -> Iterator[str]:
+def _series(capture: Capture, series: Series, sleep: Sleep) -> Iterator[str]:
     name = series.recorder.name
     if series.switched_on and not series.files:
         switch = next(s for s in series.recorder.switches if capture.properties.get(s) == "yes")
@@ -83,7 +84,7 @@ def _series(capture: Capture, series: Series) -> Iterator[str]:
         problem = _file_problem(series, file)
         if problem:
             yield f"{shown(file.entry.path)} {problem}."
-    yield from _silences(capture, series)
+    yield from _times(capture, series, sleep)
 
 
 def _file_problem(series: Series, file: LogFile) -> str:
@@ -98,36 +99,46 @@ def _file_problem(series: Series, file: LogFile) -> str:
     return file.ending if newest and not series.recorder.once else ""
 
 
-def _silences(capture: Capture, series: Series) -> Iterator[str]:
-    begin, end = capture.begun or series.first, capture.end
+def _times(capture: Capture, series: Series, sleep: Sleep) -> Iterator[str]:
+    begin, end = capture.since, capture.end
     if begin is None or end is None or series.recorder.once:
         return
     limit = series.recorder.quiet or max(SETTLED, (end - begin) / 2)
     name = series.recorder.name
     for step in series.steps:
-        # What the device still held from before is not the capture's to answer for.
-        silence = Step(max(step.before, begin), step.after)
-        times = _times(capture, step)
         if step.after <= begin:
             continue
+        times = _span(capture, step)
         if step.length < -STEP_BACK:
             yield f"{name}: the clock goes back by {duration_text(-step.length)}, {times}."
         elif step.length > DAY:
             yield f"{name}: the clock jumps, {times}."
-        elif silence.length > limit:
-            length = duration_text(silence.length)
-            yield f"{name} is silent for {length}, {_times(capture, silence)}."
-    if series.last is not None and end - max(series.last, begin) > limit:
-        time, before = clock_text(series.last, capture.begun), duration_text(end - series.last)
+    odd = [
+        silence
+        for silence in silences(series.steps, begin, capture.clock)
+        if silence.length > limit and not sleep.explains(name, silence)
+    ]
+    if odd:
+        yield f"{name} is silent {summary(odd, limit, capture.begun)}."
+    last, passed = series.last, capture.clock.passed
+    # An empty file is told of already, and its time is that of its making.
+    if last is None or _holds_nothing(series, series.files[-1]):
+        return
+    if passed(max(last, begin), end) > limit:
+        time, before = clock_text(last, capture.begun), duration_text(passed(last, end))
         yield f"{name} ends at {time}, {before} before the last of the other recordings."
 
 
-def _times(capture: Capture, step: Step) -> str:
+def _holds_nothing(series: Series, file: LogFile) -> bool:
+    return file.entry.size == 0 or (series.recorder.ring and file.track is None)
+
+
+def _span(capture: Capture, step: Step) -> str:
     before, after = (clock_text(time, capture.begun) for time in (step.before, step.after))
     return f"from {before} to {after}"
 
 
-def _thermal(capture: Capture, record: Record) -> Iterator[str]:
+def _thermal(capture: Capture, record: Record, sleep: Sleep) -> Iterator[str]:
     name = f"The thermal record {shown(record.entry.name)}"
     samples = len(record.times)
     if record.ending:
@@ -137,11 +148,16 @@ def _thermal(capture: Capture, record: Record) -> Iterator[str]:
     for zone in record.zones:  # a core that is off has no frequency
         if 0 < zone.missing < samples:
             yield f"{name} lacks {zone.name} in {zone.missing} of {samples} samples."
-    for step in map(Step, record.times, record.times[1:]):
-        if abs(step.length) > PAUSE:
-            verb = "pauses for" if step.length > 0 else "goes back by"
-            length = duration_text(abs(step.length))
-            yield f"{name} {verb} {length}, {_times(capture, step)}."
+    for step in record.steps:
+        if step.length < 0:
+            yield f"{name} goes back by {duration_text(-step.length)}, {_span(capture, step)}."
+    pauses = [
+        step
+        for step in record.steps
+        if step.length > 0 and not sleep.explains(record.entry.path, step)
+    ]
+    if pauses:
+        yield f"{name} pauses {summary(pauses, SILENCE, capture.begun)}."
 
 
 def _empty(capture: Capture) -> Iterator[str]:

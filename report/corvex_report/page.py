@@ -10,6 +10,7 @@ from .artefacts import OTHER
 from .capture import Capture, LogFile
 from .findings import findings
 from .properties import groups, version_text
+from .sleep import Sleep
 from .text import clock_text, counted, date_time, duration_text, shown, size_text, span_text
 
 TEMPLATES = Path(__file__).parent / "templates"
@@ -25,6 +26,7 @@ class FileRow:
 
 
 def render(capture: Capture) -> str:
+    sleep = Sleep(capture)
     environment = Environment(
         loader=FileSystemLoader(TEMPLATES),
         autoescape=True,
@@ -38,7 +40,8 @@ def render(capture: Capture) -> str:
     page = environment.get_template("page.html").render(
         capture=capture,
         facts=_facts(capture),
-        findings=findings(capture),
+        findings=findings(capture, sleep),
+        sleep=sleep.remark(),
         timeline=timeline.build(capture),
         when=lambda item: timeline.item_when(item, capture.begun),
         charts=[(record, charts.chart(record, capture.begun)) for record in capture.records],
@@ -46,7 +49,7 @@ def render(capture: Capture) -> str:
         files=_files(capture),
         more_files=max(0, len(capture.entries) - LISTED),
         sampled=[file.entry.path for s in capture.series for file in s.files if _sampled(file)],
-        boot=date_time(capture.clock.boot) if capture.clock.boot is not None else "",
+        boot=_boot(capture),
         at_once=AT_ONCE,
         listed=LISTED,
         other=OTHER,
@@ -70,6 +73,11 @@ def _facts(capture: Capture) -> list[tuple[str, str]]:
         ("Size", f"{size_text(capture.size)} in {counted(len(capture.entries), 'file')}"),
     ]
     return [(name, shown(value)) for name, value in facts if value]
+
+
+def _boot(capture: Capture) -> str:
+    clock = capture.clock
+    return "" if clock.boot is None else date_time(clock.from_utc(clock.boot))
 
 
 def _recorded(capture: Capture) -> str:

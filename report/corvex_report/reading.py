@@ -8,14 +8,15 @@ from . import artefacts, thermal
 from .capture import Capture, LogFile, Series
 from .clock import Clock, find_clock
 from .files import Entry, Reader, read_piece, scan
-from .line_formats import Calendar
+from .line_formats import DAY, Calendar
 from .properties import parse_properties
 from .recorders import RECORDERS, Recorder, missing_names, rotated_files
-from .tracks import Step, last_line_problem, notable, read_track
+from .tracks import Step, last_line_problem, notable, read_track, steps_between
 
 NAME = re.compile(r".+_(?P<number>\d{1,9})--(?P<time>[\d-]{19})(_current)?")
 MARK = "_current"
 FAR_FUTURE = 2.0**33
+YEAR = 365 * DAY  # 1970
 PROPERTIES = 1024 * 1024  # bytes of getprop.txt
 VERSION_FILE = 4096
 SOME = 256 * 1024  # bytes of a kernel log that are searched
@@ -30,12 +31,15 @@ def read_capture(directory: str, progress: Progress) -> Capture:
     name = os.path.basename(os.path.realpath(directory))
     match = NAME.fullmatch(name)
     begun = artefacts.stamp_time(match["time"]) if match else None
+    number = int(match["number"]) if match and begun is not None else None
     entries = scan(directory)
     written = max((entry.mtime for entry in entries), default=0.0)
-    near = min(max(written, 0.0), FAR_FUTURE) if begun is None else begun
-    return _Reading(directory, name, entries, near, progress).capture(
-        int(match["number"]) if match else None, begun
-    )
+    near = min(max(written, 0.0), FAR_FUTURE)
+    if begun is not None and (begun >= YEAR or near < YEAR):
+        near = begun
+    else:  # no time in the name, or the one of a clock that was set later
+        begun = None
+    return _Reading(directory, name, entries, near, progress).capture(number, begun)
 
 
 class _Reading:
@@ -59,9 +63,12 @@ class _Reading:
         for entry in rest:
             if _top(entry) in artefacts.LOGS:
                 self._log(entry)
-        clock = self._clock()
+        clock = self._clock(series, records)
         for one in series:
             _place_in_time(one, clock)
+        for record in records:
+            steps = clock.measured(steps_between(record.times))
+            record.steps = [step for step in steps if notable(step)]
         tracks = {path: log.track for path, log in self._logs.items() if log.track}
         others = [e for e in rest if _top(e) not in (thermal.DIRECTORY, *artefacts.OWN)]
         marked = MARK in self._name
@@ -119,11 +126,16 @@ class _Reading:
                 record.ending = log.ending
                 yield record
 
-    def _clock(self) -> Clock:
-        dated = [(log.entry, log.track) for log in self._logs.values() if log.track]
+    def _clock(self, series: list[Series], records: list[thermal.Record]) -> Clock:
+        """From what this capture recorded: copies may be of other starts of the device."""
+        live = [file.entry for one in series if not one.recorder.once for file in one.files]
+        live += [record.entry for record in records]
+        tracks = [(entry, track) for entry in live if (track := self._logs[entry.path].track)]
         newest = next((entry for entry in self._entries if entry.path == "kernel.log"), None)
         text = read_piece(self._directory, newest, SOME, at_end=True) if newest else b""
-        return find_clock(dated, text, self._properties.get("persist.sys.timezone", ""), self._near)
+        return find_clock(
+            tracks, text, self._properties.get("persist.sys.timezone", ""), self._near
+        )
 
     def _kernel_version(self) -> str:
         """From the first lines of a kernel's life, where one of the logs still holds them."""
@@ -145,15 +157,16 @@ def _place_in_time(series: Series, clock: Clock) -> None:
         track = file.track
         if track:
             file.first = clock.local(track, track.first)
-            file.last = clock.local(track, track.last)
-        if file.first is None or file.last is None or track is None:
-            file.first = file.last = clock.written(file.entry)
+            file.last = None if track.last is None else clock.local(track, track.last)
+        if file.last is None:
+            file.last = clock.written(file.entry)
             file.time_source = "time of the file"
+        if file.first is None or track is None:
+            file.first = file.last
             continue
-        shift = file.first - track.first
-        steps = [Step(step.before + shift, step.after + shift) for step in track.steps]
+        steps = clock.steps(track)
         if before is not None:
-            steps.insert(0, Step(before, file.first))
+            steps.insert(0, Step(before, file.first, clock.passed(before, file.first)))
         series.steps += [step for step in steps if notable(step)]
         before = file.last
 

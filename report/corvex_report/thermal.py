@@ -5,6 +5,7 @@ from dataclasses import dataclass, field
 
 from .files import Entry, read_piece
 from .line_formats import THERMAL, Calendar
+from .tracks import Step
 
 DIRECTORY = "kv_tsen_data"
 LARGEST = 8 * 1024 * 1024  # bytes that are read of a record: some 17 hours
@@ -38,6 +39,7 @@ class Record:
     times: list[float]
     cpus: list[Source]
     zones: list[Source]
+    steps: list[Step] = field(default_factory=list)  # pauses and steps of the clock
     unread: int = 0  # bytes
     spoiled: int = 0  # lines that are no samples
     ending: str = ""  # what is wrong with its end
@@ -57,7 +59,8 @@ LINE = re.compile(
 
 def read_record(directory: str, entry: Entry, calendar: Calendar) -> Record:
     data = read_piece(directory, entry, LARGEST)
-    record = Record(entry, [], [Source(name, None) for name in CPUS], [], entry.size - len(data))
+    record = Record(entry, [], [Source(name, None) for name in CPUS], [])
+    record.unread = entry.size - len(data)
     record.zones = [Source(name, number) for number, name in enumerate(ZONES)]
     for match in LINE.finditer(data):
         time = THERMAL.times(match[0], calendar, True)

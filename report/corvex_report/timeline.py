@@ -51,7 +51,11 @@ def build(capture: Capture) -> Timeline | None:
     times += [time for record in capture.records for time in record.times[-1:]]
     if not times:
         return None
-    begin = capture.begun or min(times)
+    if capture.begun is not None:
+        begin = capture.begun
+    else:  # artefacts may be older than the capture by far
+        firsts = [first for series in capture.series if (first := series.first) is not None]
+        begin = min(firsts or times)
     end = max(capture.end or begin, begin)
     # Artefacts may arrive later, but one name from a far future shall not crush everything else.
     reach = end + max(end - begin, 60.0)
@@ -80,15 +84,17 @@ def _series_row(capture: Capture, series: Series, scale: TimeScale) -> Row:
         row.when = span_text(series.first, series.last, capture.begun)
     row.notes = list(_notes(capture, series))
     for file in series.files:
-        if file.first is None or file.last is None:
+        if file.first is None:
             continue
-        if file.time_source:
-            title = f"{shown(file.entry.path)}, written {clock_text(file.last, capture.begun)}"
-            _mark(row, scale, file.last, title)
+        last = file.first if file.last is None else file.last
+        if last == file.first and file.time_source:
+            what = "begins" if file.last is None else "written"
+            title = f"{shown(file.entry.path)}, {what} {clock_text(last, capture.begun)}"
+            _mark(row, scale, last, title)
         else:
-            span = span_text(file.first, file.last, capture.begun)
+            span = span_text(file.first, last, capture.begun)
             title = f"{shown(file.entry.path)}: {span}, {size_text(file.entry.size)}"
-            _bar(row, scale, min(file.first, file.last), max(file.first, file.last), title)
+            _bar(row, scale, min(file.first, last), max(file.first, last), title)
     for step in series.steps:
         if step.length > 0:
             _silence(row, scale, step, capture.begun)

@@ -20,21 +20,18 @@ Format = LineFormat | PcapFormat
 
 @dataclass(frozen=True)
 class Step:
-    """Two times that follow each other in a log."""
+    """Two times that follow each other in a log, and the seconds that passed between them."""
 
     before: float
     after: float
-
-    @property
-    def length(self) -> float:
-        return self.after - self.before
+    length: float
 
 
 @dataclass
 class Track:
     format: Format
     first: float
-    last: float
+    last: float | None  # None: the tail of a large file holds none
     steps: list[Step] = field(default_factory=list)  # long ones, and those back
     sampled: bool = False
 
@@ -44,7 +41,8 @@ def notable(step: Step) -> bool:
 
 
 def steps_between(times: list[float]) -> list[Step]:
-    return [step for step in map(Step, times, times[1:]) if notable(step)]
+    steps = (Step(before, after, after - before) for before, after in zip(times, times[1:]))
+    return [step for step in steps if notable(step)]
 
 
 def find_format(head: bytes, calendar: Calendar, written: float) -> Format | None:
@@ -73,10 +71,10 @@ def _sample(reader: Reader, found: Format, calendar: Calendar) -> Track | None:
 
     low, high = 0, reader.size - found.block
     tail = times_at(high, found.block)
-    head = times_at(low, found.block)
+    head = times_at(low, max(HEAD, found.block))
     if not head:
         return None
-    track = Track(found, head[0], (tail or head)[-1], sampled=True)
+    track = Track(found, head[0], tail[-1] if tail else None, sampled=True)
     while high - low > WHOLE:
         places = [low + (high - low) * i // PLACES for i in range(PLACES + 1)]
         points = [(place, times_at(place, found.block)) for place in places]

@@ -86,13 +86,12 @@ def sample(time: float, without: tuple[str, ...] = ()) -> str:
     parts = [f"datetime={now.year}{now.month}{now.day}_{now.hour}:{now.minute}:{now.second}"]
     passed = time - BEGUN
     for cpu in range(4):
-        parts.append(
-            f"cpu{cpu}_freq={CPU_STEPS[int(passed // 9 * (2 * cpu + 1) + passed % 5 * cpu) % 4]}"
-        )
+        speed = CPU_STEPS[int(passed // 9 * (2 * cpu + 1) + passed % 5 * cpu) % 4]
+        parts.append(f"cpu{cpu}_freq={'' if f'cpu{cpu}' in without else speed}")
     names = [f"tz_sensor{i}" for i in range(11)]
     names += ["pm8841_tz", "pm8941_tz", "pa_therm0", "pa_therm1", "emmc_therm", "msm_therm"]
     for zone, name in enumerate(names):
-        heat = 33 + zone * 0.4 + (4 + zone * 0.6) * (1 - math.exp(-passed / 240))
+        heat = 33 + zone * 0.4 + (4 + zone * 0.6) * (1 - math.exp(-max(passed, 0) / 240))
         value = f"{int(1000 * (heat + math.sin(passed / 37 + zone)))}"
         parts.append(f"{name}=" + (" " * 8 if zone in (7, 12) or name in without else value))
     return ", ".join(parts) + "\n"

@@ -8,7 +8,7 @@ import unittest
 from html.parser import HTMLParser
 from pathlib import Path
 
-from fixture import make_capture
+from fixture import PROPERTIES, make_capture, put, put_properties, stamp
 
 PROGRAM = Path(__file__).parent.parent / "corvex-report"
 NOBODY = 65534
@@ -88,3 +88,16 @@ class ReportTest(unittest.TestCase):
         done = run(self.capture, "-o", output, as_user=as_user)
         self.assertEqual((done.returncode, done.stderr), (0, ""), done.stderr)
         return Page(output.read_text("utf-8"))
+
+    def bare(self, begun: float, end: float, files: dict[str, bytes]) -> Page:
+        """Of a capture of nothing but some files, each written until its end."""
+        shutil.rmtree(self.capture)
+        name = f"KVBR_2--{stamp(begun, '%Y-%m-%d-%H-%M-%S')}_current"
+        self.capture = self.parent / name
+        version = "ro.build.ota.versionname"
+        zone = {"persist.sys.timezone": "Europe/Helsinki"}
+        put_properties(self.capture, zone | {version: PROPERTIES[version]})
+        put(self.capture / "versionNumber", PROPERTIES[version].encode().ljust(92, b"\0"), begun)
+        for path, data in files.items():
+            put(self.capture / path, data, end)
+        return self.report()

@@ -114,11 +114,8 @@ class PageTest(ReportTest):
         self.assertGreater(marks["count"], 50)
 
     def test_unfolded_and_hostile(self) -> None:
-        put(
-            self.capture / "anr" / "<svg onload=alert(1)>" / ("w" * 250),
-            b"Cmd line: " + b"m" * 99,
-            BEGUN,
-        )
+        path = self.capture / "anr" / "<svg onload=alert(1)>" / ("w" * 250)
+        put(path, b"Cmd line: " + b"m" * 99, BEGUN)
         for number in range(30):
             put(self.capture / "dropbox" / f"tag_{number}@1795386830{number:03}.txt", b"x", BEGUN)
         page = self.page()
@@ -127,9 +124,8 @@ class PageTest(ReportTest):
             self.browser.run("document.querySelectorAll('details').forEach(d => d.open = true)")
             self.assertEqual(self.browser.run("return document.documentElement.scrollWidth"), width)
             self.assertEqual(self.browser.complaints(), [])
-            self.assertEqual(
-                self.browser.run("return document.querySelectorAll('[onload]').length"), 0
-            )
+            loaded = "return document.querySelectorAll('[onload]').length"
+            self.assertEqual(self.browser.run(loaded), 0)
 
     def test_picture_for_the_readme(self) -> None:
         self.spoil()
