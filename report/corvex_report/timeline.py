@@ -117,9 +117,10 @@ def _notes(capture: Capture, series: Series) -> Iterator[str]:
     if any(file.first is not None for file in series.files):
         return
     if tracks and tracks[0].format.relative:
+        first, last = tracks[0].first, tracks[-1].last
+        seconds = f"from {first:.0f} on" if last is None else f"{first:.0f} to {last:.0f}"
         yield (
-            f"counts seconds since the device’s start ({tracks[0].first:.0f} to "
-            f"{tracks[-1].last:.0f}), which is not known in time of day"
+            f"counts seconds since the device’s start ({seconds}), which is not known in time of day"
         )
     else:
         yield "bears no times"

@@ -75,6 +75,10 @@ class HealthyTest(ReportTest):
         self.assertEqual(page.odd, [])
         relative = "counts seconds since the device’s start (0 to 5600)"
         self.assert_says(page, "were not used", relative)
+        whole = (self.capture / "tz.log").read_bytes()
+        put(self.capture / "tz.log", whole + bytes(600000), 1.8e9)
+        self.assert_says(self.report(), " on), which is not known in time of day")
+        put(self.capture / "tz.log", whole, 1.8e9)
         put_properties(self.capture, PROPERTIES | {"persist.sys.timezone": "Europe/Helsinki"})
         line = "6,999,5600000000,-;PM: suspend exit 2026-11-22 22:41:30.000000000 UTC\n"
         put(self.capture / "kernel.log", kernel(END) + line.encode(), 1.8e9)
