@@ -24,7 +24,8 @@
 //   waits for that very allocation.
 // - Between a fork and the storing of its result nobody can tell which slot a child belongs to.
 //   Deliveries of that moment are counted and carried out by the starter right afterwards, so a
-//   child that ends at once is still found in its slot.
+//   child that ends at once is still found in its slot. Two threads start children; the mutex that
+//   each holds for the fork lets one of them at a time.
 
 namespace corvexd {
 namespace {
@@ -111,17 +112,19 @@ void deliver() {
 }  // namespace
 
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument) {
-  begin_start(slot);
   local_time_mutex.lock();
+  begin_start(slot);
   pid_t result = fork();
   int error = errno;
-  local_time_mutex.unlock();
   if (result == 0) {
     free_lock_in_child();
+    local_time_mutex.unlock();
     body(argument);
     _exit(1);
   }
-  for (int deferred = end_start(slot, result); deferred > 0; --deferred) deliver();
+  int deferred = end_start(slot, result);
+  local_time_mutex.unlock();
+  for (; deferred > 0; --deferred) deliver();
   errno = error;
 }
 

@@ -19,7 +19,8 @@ struct ChildSlot {
 // Forks. The child runs body(argument) and ends with status 1 if that returns; it must not return
 // into the starter's sequence in any other way, nor wait for a lock that another thread may hold
 // (allocation and local_timestamp are safe). The parent does not wait; the result of the fork is
-// in the slot (errno is the fork's), whose earlier child, if any, goes on unobserved. Main thread.
+// in the slot (errno is the fork's), whose earlier child, if any, goes on unobserved. Any thread; a
+// slot belongs to one.
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument);
 
 // Replaces the calling child by a program with the daemon's environment; ends it with status 1

@@ -1,7 +1,17 @@
-// One-shot shell commands into the current log directory.
+// Shell commands whose output goes into a file.
 #pragma once
 
+#include <android-base/unique_fd.h>
+
+#include "capture/children.h"
+
 namespace corvexd {
+
+// Starts `command` in a shell, a child in this slot, with `output` as its standard output. The
+// command line holds no name but the daemon's own, and no file's at all: the shell would open
+// whatever somebody has put there. Any thread. Waits for nothing; false when there is no output
+// (logged) or no child.
+bool start_shell(ChildSlot& slot, const char* command, android::base::unique_fd output);
 
 // Runs `command` through the shell with its output in the file `name` of LOG_DIR, given to the
 // system user while the log root lies in the data partition. Main thread. Returns after about one

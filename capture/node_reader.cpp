@@ -25,8 +25,8 @@ struct Counters {
   _exit(1);
 }
 
-void open_output(const NodeReader& reader, const char* path) {
-  *reader.to_fd = open_with_mode(path, O_WRONLY, kOutputMode);
+void begin_file(const NodeReader& reader, const char* path) {
+  *reader.to_fd = open_output(path, O_WRONLY, kOutputMode).release();
   if (*reader.to_fd == -1) fail_to_open(reader, path);
 }
 
@@ -38,8 +38,8 @@ void open_both(const NodeReader& reader, const char* output) {
   int access_mode = reader.erases_source ? O_RDWR : O_RDONLY;
   *reader.from_fd = open(reader.source, access_mode | O_CLOEXEC);
   if (*reader.from_fd == -1) fail_to_open(reader, reader.source);
-  open_output(reader, output);
-  give_to_system(output);
+  begin_file(reader, output);
+  give_to_system(*reader.to_fd);
 }
 
 // A file that has been removed under the reader takes the bytes of its last write along.
@@ -47,7 +47,7 @@ void replace_lost_output(const NodeReader& reader, const char* path) {
   if (access(path, reader.appends_when_reopened ? F_OK : R_OK) == 0) return;
   log_error(reader.texts.output_gone, path, errno, strerror(errno));
   close(*reader.to_fd);
-  open_output(reader, path);
+  begin_file(reader, path);
   if (reader.appends_when_reopened && lseek(*reader.to_fd, 0, SEEK_END) == -1) {
     log_error("corvexd: lseek failed! %s\n", strerror(errno));
     _exit(1);
@@ -62,7 +62,7 @@ void rotate_when_due(const NodeReader& reader, const char* path, Counters* count
   ++counters->count;
   close(*reader.to_fd);
   shift_series(path, counters->count, reader.owns_rotated_files);
-  *reader.to_fd = open_with_mode(path, O_WRONLY, kOutputMode);
+  *reader.to_fd = open_output(path, O_WRONLY, kOutputMode).release();
   if (*reader.to_fd == -1) {
     log_error(reader.texts.reopen_failed, path, strerror(errno));
     _exit(1);

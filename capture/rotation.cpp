@@ -3,6 +3,7 @@
 #include <errno.h>
 #include <stdio.h>
 
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
@@ -10,27 +11,35 @@
 namespace corvexd {
 namespace {
 
-using SeriesName = PathBuffer<kPathSize + 12>;  // a path, "." and any int
+using SeriesName = PathBuffer<kPathSize + 12>;  // a name, "." and any int
 
-SeriesName series_name(const char* path, int suffix) {
-  SeriesName name;
-  name.append(path);
-  if (suffix > 0) name.append_format(".%d", suffix);
-  return name;
+SeriesName series_name(const char* name, int suffix) {
+  SeriesName text;
+  text.append(name);
+  if (suffix > 0) text.append_format(".%d", suffix);
+  return text;
+}
+
+// A file that is not there is nothing to complain of.
+void complain() {
+  if (errno != ENOENT) log_error("while rotating log files");
 }
 
 }  // namespace
 
 void shift_series(const char* path, int count, bool owned) {
-  SeriesName new_name = series_name(path, count);
+  const Place place = locate(path);
+  if (place.folder == -1) return complain();
+  SeriesName new_name = series_name(place.name, count);
   for (int i = count; i >= 1; --i) {
-    SeriesName old_name = series_name(path, i - 1);
-    bool renamed = rename(old_name.c_str(), new_name.c_str()) == 0;
-    if (!renamed && errno != ENOENT) log_error("while rotating log files");
+    const SeriesName old_name = series_name(place.name, i - 1);
+    const bool renamed =
+        renameat(place.folder, old_name.c_str(), place.folder, new_name.c_str()) == 0;
+    if (!renamed) complain();
     if (owned) {
       // A name that was just renamed away has no file to give.
-      if (!renamed) give_to_system(old_name.c_str());
-      give_to_system(new_name.c_str());
+      if (!renamed) give_to_system_at(place.folder, old_name.c_str());
+      give_to_system_at(place.folder, new_name.c_str());
     }
     new_name = old_name;
   }

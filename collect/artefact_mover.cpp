@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
@@ -66,35 +67,66 @@ LongPath destination_path(const Destination& row, const Path& current, const cha
 
 // Keeps media indexers out of the log root.
 void provide_media_marker() {
-  LongPath path;
-  path.append(LOG_ROOT).append("/.nomedia");
-  unique_fd existing(open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  const Path path = Path().append(LOG_ROOT).append("/.nomedia");
+  const Place place = locate(path.c_str());
+  if (place.folder == -1) return;
+  const int flags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
+  const unique_fd existing(openat(place.folder, place.name, flags));
   if (existing != -1) return;
-  unique_fd marker(open_with_mode(path.c_str(), O_WRONLY | O_NONBLOCK, kMarkerMode));
+  const unique_fd marker = open_output_at(place.folder, place.name, O_WRONLY, kMarkerMode);
   if (marker != -1) give_to_system(marker);
 }
 
-void copy_to(int folder, const LongPath& destination, const char* name, const LongPath& source) {
-  LongPath to(destination);
-  to.append(name);
-  copy_file_at(folder, strrchr(to.c_str(), '/') + 1, source.c_str(), to.c_str());
+// A file of the destination, by a path that is cut where it does not fit.
+struct Target {
+  Target(const LongPath& directory, const char* name) : path(directory) { path.append(name); }
+  const char* name() const { return strrchr(path.c_str(), '/') + 1; }
+
+  LongPath path;
+};
+
+// The destination directory and its path.
+struct Folder {
+  unique_fd fd;
+  const LongPath& path;
+};
+
+void copy_to(const Folder& folder, const CopyEnd& from) {
+  const Target target(folder.path, from.name);
+  copy_file(from, Links::kNone, {folder.fd, target.name(), target.path.c_str()});
 }
 
-// `folder` is the destination's.
-void copy_artefact(const char* dir, const char* name, const LongPath& destination, int folder) {
-  LongPath source;
-  source.append(dir).append("/").append(name);
+// `source` is the directory `dir`.
+void copy_artefact(int source, const char* dir, const char* name, const Folder& folder) {
+  LongPath path;
+  path.append(dir).append("/").append(name);
   struct stat status;
-  bool is_folder = lstat(source.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-  if (!is_folder) return copy_to(folder, destination, name, source);
-  Directory files = open_directory(source.c_str());
-  if (!files) return;
+  bool is_folder =
+      fstatat(source, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
+  if (!is_folder) return copy_to(folder, {source, name, path.c_str()});
+  Directory files = open_directory_at(source, name);
+  if (!files) {
+    log_error("corvexd: open file failure. %s", path.c_str());
+    return;
+  }
   while (struct dirent* entry = next_entry(files)) {
     if (is_directory(files, *entry)) continue;
-    LongPath file(source);
+    LongPath file(path);
     file.append("/").append(entry->d_name);
-    copy_to(folder, destination, entry->d_name, file);
+    copy_to(folder, {dirfd(files.get()), entry->d_name, file.c_str()});
   }
+}
+
+// Makes the destination below the current log directory, without an earlier copy where the row
+// replaces one.
+unique_fd open_destination(const Destination& row, const LongPath& path, const char* name) {
+  mkdirs(path.c_str());
+  unique_fd folder = open_folder(path.c_str());
+  const Target earlier(path, name);
+  if (row.replaces && folder != -1 && faccessat(folder, earlier.name(), R_OK, 0) == 0) {
+    unlinkat(folder, earlier.name(), 0);
+  }
+  return folder;
 }
 
 }  // namespace
@@ -106,27 +138,26 @@ int movefile(const char* dir, const char* name) {
   std::unique_lock<std::mutex> lock(current_directory_mutex);
   Path current;
   if (!find_current_directory(WhichMark::kLast, &current)) {
-    if (errno != 0) log_error("corvexd: Error: %s\n", strerror(errno));
+    if (errno != 0) {
+      log_error("corvexd: Error: %s\n", strerror(errno));
+    } else {
+      log_error("corvexd: no current log directory for %s\n", name);
+    }
     return -1;
   }
   const Destination& row = find_destination(dir, name);
   const LongPath destination = destination_path(row, current, name, time);
-  if (row.replaces) {
-    LongPath earlier(destination);
-    earlier.append(name);
-    if (access(earlier.c_str(), R_OK) == 0) unlink(earlier.c_str());
-  }
-  mkdirs(destination.c_str());
-  const unique_fd folder = open_parent(destination.c_str());
+  if (!destination.fits_or_log()) return -1;
+  const Folder folder = {open_destination(row, destination, name), destination};
   lock.unlock();
   log_error("corvexd: movefile: %s\n", destination.c_str());
   if (strstr(dir, "Screenshots") != nullptr) provide_media_marker();
-  Directory source = open_directory(dir);
-  if (!source) {
+  const unique_fd source = open_folder(dir);
+  if (source == -1) {
     log_error("corvexd: Error: %s\n", strerror(errno));
     return -1;
   }
-  copy_artefact(dir, name, destination, folder);
+  copy_artefact(source, dir, name, folder);
   return 0;
 }
 

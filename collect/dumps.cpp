@@ -1,5 +1,6 @@
 #include "collect/dumps.h"
 
+#include <android-base/unique_fd.h>
 #include <errno.h>
 #include <stdlib.h>
 #include <string.h>
@@ -7,21 +8,37 @@
 #include <unistd.h>
 
 #include "capture/children.h"
+#include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "storage/current_directory.h"
 
+using android::base::unique_fd;
+
 namespace corvexd {
 namespace {
+
+constexpr char kRedirection[] = " > ";
 
 ChildSlot bugreport_slot;
 ChildSlot clear_slot;
 
+// The line says where the report goes. What opens that file is not the shell, which would follow
+// whatever somebody has put there, but this child, before it hands its output to the tool.
 void run_bugreport(const void*) {
   char file_name[100];
   const char* line = otherLogsCommand("bugreport", "BUGREPORT", file_name);
-  if (line != nullptr) _exit(system(line) == 0 ? 0 : 1);
+  if (line == nullptr) return;
+  const char* path = strstr(line, kRedirection) + strlen(kRedirection);
+  const unique_fd output = open_program_output(path);
+  if (output == -1) {
+    log_error("corvexd: open file failure. %s", path);
+    return;
+  }
+  dup2(output, STDOUT_FILENO);
+  const Path tool = Path().append(line, strstr(line, kRedirection) - line);
+  _exit(system(tool.c_str()) == 0 ? 0 : 1);
 }
 
 void run_clear(const void*) {
@@ -49,13 +66,13 @@ void cacheClear() { run_and_wait(clear_slot, run_clear, "corvexd: Clear process 
 const char* otherLogsCommand(const char* command, const char* kind, char* file_name) {
   static PathBuffer<200> line;
   Path directory;
-  if (!find_current_directory(WhichMark::kFirst, &directory)) {
+  if (!find_current_directory(WhichMark::kFirstPlain, &directory)) {
     log_error("corvexd: no current log directory for %s\n", command);
     return nullptr;
   }
   Timestamp file = local_timestamp();
   file.append("-").append(kind).append(".log");
-  line.clear().append("/system/bin/").append(command).append(" > ");
+  line.clear().append("/system/bin/").append(command).append(kRedirection);
   line.append(directory.c_str()).append("/").append(file.c_str());
   if (!file.fits() || !line.fits_or_log()) return nullptr;
   strcpy(file_name, file.c_str());

@@ -3,12 +3,14 @@
 #include <android-base/unique_fd.h>
 #include <cutils/properties.h>
 #include <errno.h>
-#include <stdio.h>
+#include <fcntl.h>
 #include <string.h>
 #include <sys/inotify.h>
 #include <unistd.h>
 
+#include "capture/exec_shell.h"
 #include "collect/artefact_mover.h"
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
@@ -69,6 +71,8 @@ constexpr BinderState kBinderStates[] = {
     {"/proc/proc_state", "state"},
 };
 
+ChildSlot input_dump;
+
 bool holds(const char* name, const char* part) { return strstr(name, part) != nullptr; }
 
 bool is_trace(const char* name) { return holds(name, "trace") || holds(name, "anr_"); }
@@ -79,20 +83,22 @@ void complete_trace(const ObserverState& state, const char* name) {
   LongPath source, target(state.anr_directory);
   source.append(kTraces).append("/").append(name);
   target.append("/").append(name);
-  if (access(target.c_str(), R_OK) == 0 && unlink(target.c_str()) != 0) {
+  const char* target_name = strrchr(target.c_str(), '/') + 1;
+  const unique_fd traces = open_folder(kTraces);
+  const unique_fd folder = open_folder(state.anr_directory.c_str());
+  if (faccessat(folder, target_name, R_OK, 0) == 0 && unlinkat(folder, target_name, 0) != 0) {
     log_error("corvexd: can't remove %s'", target.c_str());
   }
-  copy_file(source.c_str(), target.c_str());
+  copy_file({traces, name, source.c_str()}, Links::kNone, {folder, target_name, target.c_str()});
 }
 
-void dump_input(const LongPath& directory) {
+// `folder` is the trace's directory.
+void dump_input(int folder, const LongPath& directory) {
+  constexpr char kDump[] = "/system/bin/dumpsys input | xargs -0 echo";
+  constexpr char kFile[] = "dumpsys_input";
+  if (start_shell(input_dump, kDump, open_program_output_at(folder, kFile))) pause_seconds(1);
   LongPath line;
-  line.append("/system/bin/dumpsys input | xargs -0 echo > ");
-  line.append(directory.c_str()).append("dumpsys_input&");
-  if (FILE* pipe = popen(line.c_str(), "re")) {
-    pause_seconds(1);
-    pclose(pipe);
-  }
+  line.append(kDump).append(" > ").append(directory.c_str()).append(kFile).append("&");
   log_info("corvexd: anr_input is %s \n", line.c_str());
 }
 
@@ -107,14 +113,17 @@ void begin_trace(ObserverState& state, const char* name) {
     directory.append(LOG_DIR.get().c_str()).append("/anr/");
     directory.append(local_timestamp().c_str()).append("/");
     mkdirs(directory.c_str());
-    folder = open_parent(directory.c_str());
+    folder = open_folder(directory.c_str());
   }
   state.anr_directory = directory;
   for (const BinderState& binder : kBinderStates) {
     LongPath target(directory);
-    copy_file_at(folder, binder.name, binder.source, target.append(binder.name).c_str());
+    target.append(binder.name);
+    const Place source = locate(binder.source);
+    copy_file({source.folder, source.name, binder.source}, Links::kOwn,
+              {folder, binder.name, target.c_str()});
   }
-  dump_input(directory);
+  dump_input(folder, directory);
 }
 
 void handle_closed(const ObserverState& state, const char* name) {

@@ -2,10 +2,12 @@
 
 #include <errno.h>
 #include <fcntl.h>
-#include <string.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
-#include "core/path_buffer.h"
+#include <utility>
+
+#include "core/directory.h"
 #include "core/state.h"
 
 using android::base::unique_fd;
@@ -15,61 +17,101 @@ namespace {
 
 constexpr uid_t kSystemUser = 1000;
 constexpr gid_t kSystemGroup = 1000;
+constexpr mode_t kProgramOutputMode = 0666;
+constexpr int kSafely = O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
+
+// A second name may be one that somebody has given to another's file.
+bool has_one_name(const struct stat& status) {
+  if (status.st_nlink <= 1) return true;
+  errno = EMLINK;
+  return false;
+}
+
+bool is_regular(const struct stat& status) {
+  if (S_ISREG(status.st_mode)) return true;
+  errno = ENXIO;
+  return false;
+}
+
+// Passes the file on when it may be written to.
+unique_fd checked_output(unique_fd file) {
+  struct stat status;
+  bool good = file != -1 && fstat(file, &status) == 0 && is_regular(status) && has_one_name(status);
+  return good ? std::move(file) : unique_fd();
+}
+
+bool is_copyable(const struct stat& status, Links links) {
+  if (S_ISFIFO(status.st_mode)) return true;
+  return is_regular(status) && (links != Links::kNone || has_one_name(status));
+}
+
+// Reads the text of a link that the daemon's own user has made. The text is that of the very link
+// whose owner was looked at, whatever bears its name by now.
+bool read_own_link(int folder, const char* name, char (&text)[PATH_MAX]) {
+  unique_fd link(openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status;
+  if (link == -1 || fstat(link, &status) != 0) return false;
+  if (!S_ISLNK(status.st_mode) || status.st_uid != geteuid()) return false;
+  const ssize_t length = readlinkat(link, "", text, sizeof text - 1);
+  if (length <= 0) return false;
+  text[length] = '\0';
+  return true;
+}
 
 }  // namespace
 
-Directory open_directory(const char* path) { return Directory(opendir(path)); }
-
-Directory open_directory_at(int parent, const char* name) {
-  int fd = openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-  if (fd == -1) return nullptr;
-  Directory directory(fdopendir(fd));
-  if (!directory) close(fd);
-  return directory;
+unique_fd open_output(const char* path, int flags, mode_t mode) {
+  const Place place = locate(path);
+  return place.folder == -1 ? unique_fd() : open_output_at(place.folder, place.name, flags, mode);
 }
 
-struct dirent* next_entry(const Directory& directory) {
-  while (struct dirent* entry = readdir(directory.get())) {
-    if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0) return entry;
+unique_fd open_output_at(int folder, const char* name, int flags, mode_t mode) {
+  flags |= O_CREAT | kSafely;
+  unique_fd file(openat(folder, name, flags | O_EXCL, mode));
+  if (file != -1) {
+    fchmod(file, mode);
+    return file;
   }
-  return nullptr;
+  if (errno != EEXIST) return file;
+  return checked_output(unique_fd(openat(folder, name, flags, mode)));
 }
 
-bool is_directory(const Directory& directory, const struct dirent& entry) {
-  if (entry.d_type != DT_UNKNOWN) return entry.d_type == DT_DIR;
+unique_fd open_program_output(const char* path) {
+  const Place place = locate(path);
+  return place.folder == -1 ? unique_fd() : open_program_output_at(place.folder, place.name);
+}
+
+unique_fd open_program_output_at(int folder, const char* name) {
+  const int flags = O_WRONLY | O_CREAT | kSafely;
+  unique_fd file = checked_output(unique_fd(openat(folder, name, flags, kProgramOutputMode)));
+  // Not before it is known whose file it is.
+  if (file != -1 && ftruncate(file, 0) != 0) return unique_fd();
+  return file;
+}
+
+unique_fd open_source_at(int folder, const char* name, Links links) {
+  char target[PATH_MAX];
+  const bool follows = links == Links::kOwn && read_own_link(folder, name, target);
+  if (follows) name = target;
+  // Looked at first: opening a device can do something by itself.
   struct stat status;
-  int result = fstatat(dirfd(directory.get()), entry.d_name, &status, AT_SYMLINK_NOFOLLOW);
-  return result == 0 && S_ISDIR(status.st_mode);
-}
-
-int make_directory(const char* path, mode_t mode) {
-  if (mkdir(path, mode) != 0) return -1;
-  chmod(path, mode);
-  return 0;
-}
-
-int open_with_mode(const char* path, int flags, mode_t mode) {
-  return open_with_mode_at(AT_FDCWD, path, flags, mode);
-}
-
-int open_with_mode_at(int parent, const char* name, int flags, mode_t mode) {
-  flags |= O_CREAT | O_CLOEXEC;
-  int fd = openat(parent, name, flags | O_EXCL, mode);
-  if (fd == -1) return errno == EEXIST ? openat(parent, name, flags, mode) : -1;
-  fchmod(fd, mode);
-  return fd;
-}
-
-unique_fd open_parent(const char* path) {
-  LongPath parent;
-  parent.append(path, strrchr(path, '/') + 1 - path);
-  return unique_fd(open(parent.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-}
-
-int give_to_system(const char* path) {
-  return isInDataPartition ? chown(path, kSystemUser, kSystemGroup) : 0;
+  if (fstatat(folder, name, &status, follows ? 0 : AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
+  if (!is_copyable(status, links)) return unique_fd();
+  const int flags = O_RDONLY | (follows ? kSafely & ~O_NOFOLLOW : kSafely);
+  unique_fd file(openat(folder, name, flags));
+  if (file == -1 || fstat(file, &status) != 0 || !is_copyable(status, links)) return unique_fd();
+  return file;
 }
 
 int give_to_system(int fd) { return isInDataPartition ? fchown(fd, kSystemUser, kSystemGroup) : 0; }
+
+int give_to_system_at(int folder, const char* name) {
+  if (!isInDataPartition) return 0;
+  unique_fd file(openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status;
+  if (file == -1 || fstat(file, &status) != 0) return -1;
+  if (!is_regular(status) || !has_one_name(status)) return -1;
+  return fchownat(file, "", kSystemUser, kSystemGroup, AT_EMPTY_PATH);
+}
 
 }  // namespace corvexd

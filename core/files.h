@@ -1,45 +1,35 @@
-// Directories, files and owners: what the rooms share of the file system.
+// Files that are written, files that are copied, and owners, among files that others can write.
 #pragma once
 
 #include <android-base/unique_fd.h>
-#include <dirent.h>
-#include <sys/stat.h>
-
-#include <memory>
+#include <sys/types.h>
 
 namespace corvexd {
 
-struct CloseDirectory {
-  void operator()(DIR* directory) const { closedir(directory); }
-};
-using Directory = std::unique_ptr<DIR, CloseDirectory>;
+// All of these: close-on-exec, never waiting for the other end of a FIFO; the caller owns the
+// descriptor, which is -1 with errno set on failure.
 
-// Opens a directory for listing, close-on-exec; null with errno set on failure. The second one
-// opens an entry of the directory `parent`, and never what a link names.
-Directory open_directory(const char* path);
-Directory open_directory_at(int parent, const char* name);
+// Open a file for writing, with open(2)'s `flags` and O_CREAT. It is a regular file that bears no
+// other name, and no link is followed to it; anything else is a failure. A file that it creates has
+// exactly `mode`, whatever umask the daemon was started with; children inherit that as it is.
+android::base::unique_fd open_output(const char* path, int flags, mode_t mode);
+android::base::unique_fd open_output_at(int folder, const char* name, int flags, mode_t mode);
 
-// The next entry that is neither "." nor ".."; null at the end. Valid until the next call.
-struct dirent* next_entry(const Directory& directory);
+// The same for the output of a program, as a shell opens it: emptied, and created with what the
+// umask leaves of 0666.
+android::base::unique_fd open_program_output(const char* path);
+android::base::unique_fd open_program_output_at(int folder, const char* name);
 
-// Whether the entry itself (not what a link names) is a directory.
-bool is_directory(const Directory& directory, const struct dirent& entry);
+// Which links a source may be reached through: none, be they symbolic or a second name of a file;
+// or symbolic ones that the daemon's own user has made.
+enum class Links { kNone, kOwn };
 
-// mkdir(2) and open(2), but a directory or file that they create has exactly `mode`, whatever umask
-// the daemon was started with. The umask stays as it is: children inherit it. open_with_mode adds
-// O_CREAT and O_CLOEXEC to `flags`; the caller owns the descriptor. -1 with errno set on failure.
-int make_directory(const char* path, mode_t mode);
-int open_with_mode(const char* path, int flags, mode_t mode);
-int open_with_mode_at(int parent, const char* name, int flags, mode_t mode);
+// Opens a file to be copied: a regular file, or a FIFO, which is read as far as it goes.
+android::base::unique_fd open_source_at(int folder, const char* name, Links links);
 
-// Opens the directory in which the last name of `path` stands (`path` itself when it ends in "/"),
-// to make files there by name even after it was renamed. Close-on-exec; -1 with errno set on
-// failure.
-android::base::unique_fd open_parent(const char* path);
-
-// Give a path or an open file to the system user while the log root lies in the data partition;
-// elsewhere do nothing. 0, or -1 with errno set.
-int give_to_system(const char* path);
+// Give an open file or directory, or a regular file by its name, to the system user while the log
+// root lies in the data partition; elsewhere do nothing. 0, or -1 with errno set.
 int give_to_system(int fd);
+int give_to_system_at(int folder, const char* name);
 
 }  // namespace corvexd

@@ -10,6 +10,7 @@
 #include <initializer_list>
 
 #include "capture/logcat_vector.h"
+#include "core/directory.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "core/pause.h"
@@ -79,7 +80,9 @@ void renameOldBootLog(const char* path) {
   if (access(path, R_OK) != 0) return;
   const Path old_generation = Path().append(path).append(".pre");
   if (!old_generation.fits_or_log()) return;
-  if (rename(path, old_generation.c_str()) != 0) {
+  const Place place = locate(path);
+  const char* old_name = strrchr(old_generation.c_str(), '/') + 1;
+  if (place.folder == -1 || renameat(place.folder, place.name, place.folder, old_name) != 0) {
     log_error("corvexd: Rename %s failed! Error: %s\n", path, strerror(errno));
   }
 }

@@ -2,7 +2,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "core/files.h"
+#include "core/directory.h"
 #include "early/initial_log.h"
 
 namespace corvexd {
@@ -14,9 +14,7 @@ uint32_t size_below(const Directory& directory) {
   uint32_t total = 0;
   while (struct dirent* entry = next_entry(directory)) {
     if (is_directory(directory, *entry)) {
-      int fd = openat(dirfd(directory.get()), entry->d_name,
-                      O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-      Directory below(fd == -1 ? nullptr : fdopendir(fd));
+      const Directory below = open_directory_at(dirfd(directory.get()), entry->d_name);
       total += below ? size_below(below) : static_cast<uint32_t>(-1);
       continue;
     }

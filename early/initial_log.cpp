@@ -1,10 +1,12 @@
 #include "early/initial_log.h"
 
 #include <cutils/properties.h>
+#include <fcntl.h>
 #include <unistd.h>
 
 #include "capture/children.h"
 #include "capture/logcat_vector.h"
+#include "core/directory.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "core/pause.h"
@@ -85,7 +87,8 @@ bool deleteFile() {
   for (const char* name : kDeletionOrder) {
     const Path path = cache_file(name);
     if (access(path.c_str(), R_OK) != 0) continue;
-    if (unlink(path.c_str()) == 0) return true;
+    const Place place = locate(path.c_str());
+    if (place.folder != -1 && unlinkat(place.folder, place.name, 0) == 0) return true;
     log_error("corvexd: can't remove %s \n", path.c_str());
     return false;
   }

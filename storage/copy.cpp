@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
@@ -30,48 +31,48 @@ void copy_content(int from, int to) {
   }
 }
 
-// Opens the directory `path`, made when missing; false when it cannot be made. Kept open, it takes
-// the copies even after a new capture has renamed what it lies in.
-bool open_or_make_folder(const char* path, unique_fd* folder) {
-  constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
-  folder->reset(open(path, kFlags));
-  if (*folder != -1) return true;
-  if (make_directory(path, kFolderMode) != 0) {
-    log_error("corvexd: fail to mkdir");
-    return false;
-  }
-  give_to_system(path);
-  folder->reset(open(path, kFlags));
-  return true;
+// Opens the directory `path`, made when missing; -1 when it cannot be. Kept open, it takes the
+// copies even after a new capture has renamed what it lies in.
+unique_fd open_or_make_folder(const char* path) {
+  const Place place = locate(path);
+  unique_fd folder;
+  if (place.folder != -1) folder = open_folder_at(place.folder, place.name);
+  if (place.folder == -1 || folder != -1) return folder;
+  folder = make_folder(place.folder, place.name, kFolderMode);
+  if (folder != -1) give_to_system(folder);
+  return folder;
 }
 
-// Follows a link, as the copy will; an entry that has vanished is no file.
-bool is_file(const char* path) {
+// Follows a link; an entry that has vanished is no file.
+bool is_file(int folder, const char* name) {
   struct stat status;
-  return stat(path, &status) == 0 && !S_ISDIR(status.st_mode);
+  return fstatat(folder, name, &status, 0) == 0 && !S_ISDIR(status.st_mode);
 }
 
 }  // namespace
 
-int copy_file(const char* src, const char* dst) { return copy_file_at(AT_FDCWD, dst, src, dst); }
-
-int copy_file_at(int folder, const char* name, const char* src, const char* dst) {
-  log_error("corvexd: copy_file %s '%s'", src, dst);
-  // Neither end may hold up the daemon when it is a FIFO; plain files do not notice the flag.
-  unique_fd from(open(src, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  unique_fd to(open_with_mode_at(folder, name, O_WRONLY | O_APPEND | O_NONBLOCK, kFileMode));
-  if (from == -1 && to == -1) {
-    log_error("corvexd: open file failure. %s, %s", src, dst);
+int copy_file(const CopyEnd& from, Links links, const CopyEnd& to) {
+  log_error("corvexd: copy_file %s '%s'", from.path, to.path);
+  const unique_fd source = open_source_at(from.folder, from.name, links);
+  const unique_fd target = open_output_at(to.folder, to.name, O_WRONLY | O_APPEND, kFileMode);
+  if (source == -1 && target == -1) {
+    log_error("corvexd: open file failure. %s, %s", from.path, to.path);
     return -1;
   }
-  if (from == -1 || to == -1) {
-    log_error("corvexd: open file failure. %s", from == -1 ? src : dst);
+  if (source == -1 || target == -1) {
+    log_error("corvexd: open file failure. %s", source == -1 ? from.path : to.path);
     return -1;
   }
-  copy_content(from, to);
-  give_to_system(to);
-  log_error("corvexd: copy_file '%s'", dst);
+  copy_content(source, target);
+  give_to_system(target);
+  log_error("corvexd: copy_file '%s'", to.path);
   return 1;
+}
+
+int copy_file(const char* src, const char* dst) {
+  const Place from = locate(src);
+  const Place to = locate(dst);
+  return copy_file({from.folder, from.name, src}, Links::kOwn, {to.folder, to.name, dst});
 }
 
 void copy_folder(const char* src_dir, const char* sub) {
@@ -81,18 +82,22 @@ void copy_folder(const char* src_dir, const char* sub) {
   std::unique_lock<std::mutex> lock(current_directory_mutex);
   Path path = LOG_DIR.get();
   // Before the first capture there is no log directory, and nothing is to be made elsewhere.
-  if (*path.c_str() == '\0') {
+  const bool is_known = *path.c_str() != '\0';
+  if (!path.append(sub).fits_or_log()) return;
+  const unique_fd folder = is_known ? open_or_make_folder(path.c_str()) : unique_fd();
+  lock.unlock();
+  if (folder == -1) {
     log_error("corvexd: fail to mkdir");
     return;
   }
-  unique_fd folder;
-  if (!path.append(sub).fits_or_log() || !open_or_make_folder(path.c_str(), &folder)) return;
-  lock.unlock();
+  const int from_folder = dirfd(source.get());
   while (struct dirent* entry = next_entry(source)) {
-    Path from = Path().append(src_dir).append(entry->d_name);
-    Path to = Path(path).append(entry->d_name);
+    const Path from = Path().append(src_dir).append(entry->d_name);
+    const Path to = Path(path).append(entry->d_name);
     if (!from.fits_or_log() || !to.fits_or_log()) continue;
-    if (is_file(from.c_str())) copy_file_at(folder, entry->d_name, from.c_str(), to.c_str());
+    if (!is_file(from_folder, entry->d_name)) continue;
+    copy_file({from_folder, entry->d_name, from.c_str()}, Links::kOwn,
+              {folder, entry->d_name, to.c_str()});
   }
 }
 

@@ -1,20 +1,31 @@
-// The two copies that the whole daemon uses.
+// The copies that the whole daemon uses.
 #pragma once
+
+#include "core/files.h"
 
 namespace corvexd {
 
-// Appends the content of `src` to `dst`, which is created with mode 0644 when missing and given to
-// the system user while the log root lies in the data partition. A FIFO or device is read as far as
-// it can be without waiting. Any thread. Returns 1 when both could be opened, -1 otherwise
-// (logged); what a read or write error in the middle leaves stays.
+// One end of a copy: a file in an open directory (-1 for one that could not be reached), and what
+// the log calls it.
+struct CopyEnd {
+  int folder;
+  const char* name;
+  const char* path;
+};
+
+// Appends the content of `from` to `to`, which is created with mode 0644 when missing and given to
+// the system user while the log root lies in the data partition. The source is a regular file, or a
+// FIFO, which is read as far as it can be without waiting; `links` says which links lead to it. The
+// destination is a regular file, and no link leads to it. Any thread. Returns 1 when both could be
+// opened, -1 otherwise (logged); what a read or write error in the middle leaves stays.
+int copy_file(const CopyEnd& from, Links links, const CopyEnd& to);
+
+// The same by paths; links to the source that are the daemon's own user's are followed.
 int copy_file(const char* src, const char* dst);
 
-// The same to the file `name` in the open directory `folder`; `dst` is its path for the log.
-int copy_file_at(int folder, const char* name, const char* src, const char* dst);
-
 // Copies every entry of `src_dir` that is not a directory into LOG_DIR + `sub`, which is made (one
-// level) when missing. Both names end in "/". Any thread; LOG_DIR is read once, at the start. What
-// cannot be copied is logged and passed over.
+// level) when missing. Both names end in "/". Links that are the daemon's own user's are followed.
+// Any thread; LOG_DIR is read once, at the start. What cannot be copied is logged and passed over.
 void copy_folder(const char* src_dir, const char* sub);
 
 }  // namespace corvexd

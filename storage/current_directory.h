@@ -7,12 +7,14 @@
 
 namespace corvexd {
 
-// Normally one directory bears the mark; when there are more, jobs differ in which one they take.
-enum class WhichMark { kFirst, kLast };  // in the order of the listing
+// Normally one directory bears the mark; when there are more, jobs differ in which one they take,
+// in the order of the listing. A name that is to stand in a shell line must mean itself there:
+// others than the daemon can make directories, too.
+enum class WhichMark { kFirst, kFirstPlain, kLast };
 
 // Sets *path to the directory under LOG_ROOT whose name holds "_current". Any thread. False, with
-// *path untouched, when the root cannot be opened (errno says why) or holds none whose path fits
-// (errno is 0).
+// *path untouched, when the root cannot be opened (errno says why) or holds none to be taken
+// (errno is 0). A marked directory whose path does not fit is logged and passed over.
 bool find_current_directory(WhichMark which, Path* path);
 
 // Held for the moment in which the mark passes to a new directory, and by a worker from looking up

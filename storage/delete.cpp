@@ -8,7 +8,7 @@
 
 #include <utility>
 
-#include "core/files.h"
+#include "core/directory.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
 

@@ -8,6 +8,7 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "core/directory.h"
 #include "core/end.h"
 #include "core/files.h"
 #include "core/local_time.h"
@@ -26,14 +27,14 @@ constexpr char kCurrentMark[] = "_current";
 constexpr char kDirectoryMark[] = "KVBR_";
 constexpr mode_t kVersionFileMode = 0600;
 
-void remove_mark(const char* name) {
-  size_t kept = strlen(name) - strlen(kCurrentMark);
-  Path old_path = Path().append(LOG_ROOT).append("/").append(name);
-  Path new_path = Path().append(LOG_ROOT).append("/").append(name, kept);
+void remove_mark(const Directory& root, const char* name) {
+  const Path old_path = Path().append(LOG_ROOT).append("/").append(name);
   if (!old_path.fits_or_log()) return;
+  const Path new_name = Path().append(name, strlen(name) - strlen(kCurrentMark));
+  const Path new_path = Path().append(LOG_ROOT).append("/").append(new_name.c_str());
   log_info("corvexd: NEW IS %s \n", new_path.c_str());
   log_info("corvexd: OLD IS %s \n", old_path.c_str());
-  if (rename(old_path.c_str(), new_path.c_str()) == 0) {
+  if (renameat(dirfd(root.get()), name, dirfd(root.get()), new_name.c_str()) == 0) {
     log_info("corvexd: RENAME SUCCESSFULL!");
   } else {
     log_error("corvexd: Rename failed! Error: %s\n", strerror(errno));
@@ -72,7 +73,7 @@ unique_fd write_version(const Path& directory) {
   log_info("corvexd: vn is %s \n", path.c_str());
   char version[PROPERTY_VALUE_MAX] = {};
   property_get("ro.build.ota.versionname", version, "");
-  unique_fd fd(open_with_mode(path.c_str(), O_WRONLY, kVersionFileMode));
+  unique_fd fd = open_output(path.c_str(), O_WRONLY, kVersionFileMode);
   if (fd == -1) {
     log_error("corvexd: Open %s Error：%s\n", path.c_str(), strerror(errno));
     end_daemon();
@@ -106,7 +107,7 @@ void renameLastDirectoryName() {
   while (struct dirent* entry = next_entry(root)) {
     if (!is_directory(root, *entry)) continue;
     log_info("corvexd: DIR NAME : %s \n", entry->d_name);
-    if (strstr(entry->d_name, kCurrentMark) != nullptr) remove_mark(entry->d_name);
+    if (strstr(entry->d_name, kCurrentMark) != nullptr) remove_mark(root, entry->d_name);
   }
 }
 
@@ -120,7 +121,8 @@ int createLogDirectory() {
   LOG_DIR.set(directory);
   log_info("corvexd: log dir is %s \n", directory.c_str());
   mkdirs(directory.c_str());
-  give_to_system(directory.c_str());
+  const unique_fd made = open_folder(directory.c_str());
+  if (made != -1) give_to_system(made);
 
   unique_fd version_file = write_version(directory);
   copy_marker(after_source, Path(directory).append("/fileAfter911"));

@@ -4,8 +4,11 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/log.h"
+
+using android::base::unique_fd;
 
 namespace corvexd {
 namespace {
@@ -16,13 +19,17 @@ constexpr mode_t kMode = 0755;
 // What cannot be asked for may still be there to be opened.
 bool exists(const char* path) { return access(path, F_OK) == 0 || open_directory(path); }
 
-bool create(const char* path) {
-  if (make_directory(path, kMode) != 0) {
+// -1 (logged) on failure.
+unique_fd create(const char* path) {
+  const Place place = locate(path);
+  unique_fd made;
+  if (place.folder != -1) made = make_folder(place.folder, place.name, kMode);
+  if (made == -1) {
     log_error("corvexd: Directory create failed! Error: %s\n", strerror(errno));
-    return false;
+  } else {
+    log_info("corvexd: Log Directory created successfully, path is %s \n", path);
   }
-  log_info("corvexd: Log Directory created successfully, path is %s \n", path);
-  return true;
+  return made;
 }
 
 }  // namespace
@@ -41,14 +48,16 @@ int mkdirs(const char* path) {
   for (; slash != nullptr; slash = strchr(slash + 1, '/')) {
     *slash = '\0';
     if (!exists(working)) {
-      if (!create(working)) return -1;
-      if (give_to_system(working) != 0) log_info("corvexd: fail to chown, path is %s \n", working);
+      const unique_fd made = create(working);
+      if (made == -1) return -1;
+      if (give_to_system(made) != 0) log_info("corvexd: fail to chown, path is %s \n", working);
     }
     *slash = '/';
   }
   if (working[0] == '\0' || access(working, F_OK) == 0) return 0;
-  if (!create(working)) return -1;
-  give_to_system(working);
+  const unique_fd made = create(working);
+  if (made == -1) return -1;
+  give_to_system(made);
   return 0;
 }
 

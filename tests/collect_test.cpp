@@ -11,6 +11,7 @@
 #include <map>
 #include <thread>
 
+#include "collect/artefact_mover.h"
 #include "collect/file_observer.h"
 #include "core/state.h"
 #include "tests/daemon.h"
@@ -42,6 +43,24 @@ class Collect : public DeviceTest {
   PropertyService service;
 };
 
+// A daemon that has its watches: what happens before, nobody sees.
+class Observer : public Daemon {
+ public:
+  explicit Observer(LogCatcher& log) : Daemon(log) {
+    EXPECT_TRUE(eventually([this] { return watches() == 8; })) << "one directory is missing";
+  }
+
+ private:
+  long watches() const {
+    const std::string folder = "/proc/" + std::to_string(pid()) + "/fdinfo/";
+    std::string all;
+    for (const std::string& fd : list(folder)) all += read_file(folder + fd);
+    long count = 0;
+    for (size_t at = 0; (at = all.find("inotify wd:", at)) != all.npos; ++at) ++count;
+    return count;
+  }
+};
+
 // Every file below a directory, by its path in it without the names that are times.
 std::map<std::string, std::string> files_below(const std::string& directory) {
   std::map<std::string, std::string> files;
@@ -60,7 +79,7 @@ std::map<std::string, std::string> files_below(const std::string& directory) {
 }
 
 TEST_F(Collect, EveryArtefactComesToItsPlace) {
-  Daemon daemon(log);
+  Observer daemon(log);
   const std::string current = current_directory();
   struct {
     const char* commands;  // as the producers make the artefact
@@ -121,7 +140,7 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
 }
 
 TEST_F(Collect, ABurstOfTombstonesIsCollectedWhole) {
-  Daemon daemon(log);
+  Observer daemon(log);
   auto memory = [&] {
     std::string status = read_file("/proc/" + std::to_string(daemon.pid()) + "/status");
     return atol(status.c_str() + status.find("RssAnon:") + strlen("RssAnon:"));
@@ -147,7 +166,7 @@ TEST_F(Collect, ABurstOfTombstonesIsCollectedWhole) {
 }
 
 TEST_F(Collect, NewCapturesDuringArtefactsLeaveOneMarkAndLoseNone) {
-  Daemon daemon(log);
+  Observer daemon(log);
   std::atomic<bool> done{false};
   std::thread producer([&done] {
     for (int i = 0; !done; ++i) {
@@ -168,6 +187,80 @@ TEST_F(Collect, NewCapturesDuringArtefactsLeaveOneMarkAndLoseNone) {
     if (line.find("/tombstone_") == line.npos) continue;
     EXPECT_EQ(line.npos, line.find("open file failure. /data/corvex")) << line;
   }
+}
+
+TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
+  write_file("/probe/secret", "secret");
+  Observer daemon(log);
+  const std::string current = current_directory();
+  log.clear();
+  run("mkdir /data/coredump/elsewhere /data/misc/display/raw_dir /data/misc/display/raw_gone; "
+      "cd /data/misc/display/raw_dir; echo r > file; ln -s /probe/secret link; mkfifo fifo; "
+      "cd /data/coredump; ln -s /probe/secret core_link; ln /probe/secret core_hard; "
+      "mkfifo core_fifo; ln -s elsewhere core_folder; echo core > core_file");
+  EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_file"] == "core\n"; }));
+  for (const char* name : {"core_link", "core_hard", "core_folder"}) {
+    EXPECT_TRUE(log.has(std::string("corvexd: open file failure. /data/coredump//") + name));
+  }
+  EXPECT_EQ((Texts{"core_fifo", "core_file", "core_folder", "core_hard", "core_link"}),
+            list(current + "/coredump"));
+  // What a link of a watched directory's name leads to is not a watched directory.
+  run("mv /data/tombstones /data/true && ln -s /probe /data/tombstones && echo > /data/true/x && "
+      "mv /data/true/x /data/true/tombstone_x && echo t >> /data/true/tombstone_x");
+  EXPECT_TRUE(log.has("corvexd: Error: Not a directory\n"));
+  for (const auto& [name, content] : files_below(current)) EXPECT_NE("secret", content) << name;
+
+  // Where the copies go is no less suspect.
+  run("rm -r " + current + "/coredump && ln -s /probe " + current + "/coredump");
+  write_file("/data/coredump/core_last", "last");
+  EXPECT_TRUE(log.has("corvexd: open file failure. " + current + "/coredump/core_last"));
+  EXPECT_FALSE(exists("/probe/core_last"));
+}
+
+TEST_F(Collect, WhatHasNoPlaceIsSaid) {
+  checkLogPath();
+  EXPECT_EQ(-1, movefile("/data/coredump/", "core"));
+  EXPECT_TRUE(log.has("corvexd: no current log directory for core\n"));
+  run("mkdir /data/corvex/" + std::string(190, 'u') + "_current");
+  log.clear();
+  EXPECT_EQ(-1, movefile("/data/coredump/", "core"));
+  EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/uuu"));
+  run("mkdir /data/corvex/a_current");
+  EXPECT_EQ(-1, movefile("/data/misc/display/", std::string(240, 'r').c_str()));
+  EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/a_current/rawdata/rrr"));
+  EXPECT_EQ(Texts{}, list("/data/corvex/a_current"));
+}
+
+TEST_F(Collect, AHangingDumpHoldsUpNobody) {
+  write_script("/system/bin/getprop", "exec sleep 600");
+  write_script("/system/bin/dumpsys", "exec sleep 600");
+  Observer daemon(log);
+  write_file("/data/anr/anr_1", "trace");
+  write_file("/data/coredump/core_1", "core");
+  const std::string current = current_directory();
+  EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_1"] == "core"; }));
+  EXPECT_TRUE(eventually([&] { return files_below(current)["anr/TIME/anr_1"] == "trace"; }));
+  EXPECT_EQ("CLEANFAILED", send_commands({"LOGBEGIN", "DELETELOG"}));
+  EXPECT_EQ(1u, log.count("corvexd: shell_cmd is getprop > "));
+  EXPECT_EQ(1u, log.count("corvexd: anr_input is /system/bin/dumpsys input | xargs -0 echo > " +
+                          current + "/anr/"));
+  run("pkill -KILL sleep");
+}
+
+// A directory's name can hold what a shell would run.
+TEST_F(Collect, AReportGoesWhereNoNameIsACommand) {
+  write_script("/system/bin/bugreport", "echo report");
+  run("cd /data/corvex && mkdir 'x;touch >pwned;_current' '$(touch pwned)_current' "
+      "'`touch pwned`_current' 'a b_current' && ln -s /probe c_current && touch d_current");
+  set_property("persist.sys.assert.panic", "false");
+  Daemon daemon(log);
+  send_commands({"BUGREPORT"});
+  EXPECT_TRUE(log.has("corvexd: no current log directory for bugreport\n"));
+  run("mkdir -p /data/corvex/-n_current");
+  send_commands({"BUGREPORT"});
+  ASSERT_EQ(1u, list("/data/corvex/-n_current").size());
+  EXPECT_EQ("report\n", read_file("/data/corvex/-n_current/" + list("/data/corvex/-n_current")[0]));
+  EXPECT_FALSE(exists("/pwned") || exists("/data/corvex/pwned"));
 }
 
 TEST_F(Collect, EventRecordsAreNotTrusted) {

@@ -1,6 +1,7 @@
 #include "storage/copy.h"
 
 #include <fcntl.h>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -52,7 +53,37 @@ TEST_F(Copy, NeitherAFifoNorAFullDiskHoldsItUp) {
   close(both_ends);
   mkfifo("/data/log/sink", 0600);
   EXPECT_EQ(-1, copy_file("/data/log/fifo", "/data/log/sink"));
-  EXPECT_EQ(1, copy_file("/data/log/fifo", "/dev/full")) << "a full disk loses only the copy";
+  run("mkdir /data/log/full");
+  ASSERT_EQ(0, mount("full", "/data/log/full", "tmpfs", 0, "nr_blocks=1"));
+  write_file("/data/from/large", std::string(8192, 'x'));
+  EXPECT_EQ(1, copy_file("/data/from/large", "/data/log/full/copy")) << "only the copy is lost";
+  umount("/data/log/full");
+}
+
+TEST_F(Copy, LinksOfOthersLeadNowhere) {
+  write_file("/probe/secret", "secret");
+  run("cd /data/from && ln -s /probe/secret own && ln -s /probe/secret others && "
+      "ln -s /dev/zero device && echo plain > plain");
+  if (!owners_work()) unlink("/data/from/others");
+  lchown("/data/from/others", 10001, 10001);
+  run("ln -s /probe/secret /data/log/link");
+  copy_folder("/data/from/", "/sub/");
+  EXPECT_EQ("secret", read_file("/data/log/sub/own"));
+  EXPECT_EQ("plain\n", read_file("/data/log/sub/plain"));
+  EXPECT_EQ("", read_file("/data/log/sub/others"));
+  EXPECT_EQ("", read_file("/data/log/sub/device")) << "a device has no end";
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/from/device"));
+  EXPECT_EQ(owners_work(), log.count("open file failure. /data/from/others") == 1);
+  EXPECT_EQ(-1, copy_file("/data/from/plain", "/data/log/link"));
+  EXPECT_EQ(-1, copy_file("/data/from/plain", "/dev/full"));
+  EXPECT_EQ("secret", read_file("/probe/secret"));
+
+  run("rm -r /data/log/sub && ln -s /probe /data/log/sub && ln -s /data/from /cache/recovery");
+  log.clear();
+  copy_folder("/data/from/", "/sub/");
+  EXPECT_TRUE(log.has("corvexd: fail to mkdir"));
+  copy_folder("/cache/recovery/", "/recovery/");
+  EXPECT_FALSE(exists("/probe/plain") || exists("/data/log/recovery"));
 }
 
 TEST_F(Copy, FolderTakesEveryPlainFileWhateverItsName) {

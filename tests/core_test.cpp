@@ -1,5 +1,11 @@
 #include "core/settings.h"
 
+#include <errno.h>
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "core/directory.h"
+#include "core/files.h"
 #include "core/state.h"
 #include "tests/device_root.h"
 
@@ -42,6 +48,65 @@ TEST_F(Core, LogRootFollowsItsTwoProperties) {
     EXPECT_EQ(root + "/KVBR_", LOG_PATH.load());
     EXPECT_EQ(row.in_data, isInDataPartition == 1);
   }
+}
+
+// What somebody may have put where the daemon is to write, and what becomes of the daemon's opening
+// it. The target, which stands outside, keeps its content and its owner.
+TEST_F(Core, AnOutputIsARegularFileThatNoLinkLeadsTo) {
+  struct {
+    const char* planted;
+    int error;
+  } rows[] = {{"ln -s /probe/target out", ELOOP},
+              {"ln -s /probe/none out", ELOOP},
+              {"ln /probe/target out", EMLINK},
+              {"mkfifo out", ENXIO},
+              {"mkdir out", EISDIR},
+              {"ln -s /dev/full out", ELOOP},
+              {"echo mine > out", 0},
+              {"true", 0}};
+  write_file("/probe/target", "target");
+  run("mkdir /data/out");
+  for (const auto& row : rows) {
+    run(std::string("cd /data/out && rm -rf out && ") + row.planted);
+    for (auto* open_it :
+         {+[] { return open_output("/data/out/out", O_WRONLY | O_APPEND, 0640).release(); },
+          +[] { return open_program_output("/data/out/out").release(); }}) {
+      const int fd = open_it();
+      EXPECT_EQ(row.error, fd == -1 ? errno : 0) << row.planted;
+      close(fd);
+    }
+    EXPECT_FALSE(exists("/probe/none"));
+    EXPECT_EQ("target", read_file("/probe/target"));
+    give_to_system_at(open_folder("/data/out"), "out");
+    EXPECT_FALSE(is_systems("/probe/target")) << row.planted;
+  }
+  EXPECT_EQ("", read_file("/data/out/out")) << "a program's output begins empty";
+  EXPECT_EQ(0640u, mode_of("/data/out/out")) << "whatever the umask";
+  unlink("/data/out/out");
+  open_program_output("/data/out/out");
+  EXPECT_EQ(0600u, mode_of("/data/out/out")) << "as the umask has it";
+  EXPECT_EQ(owners_work(), give_to_system_at(open_folder("/data/out"), "out") == 0);
+  EXPECT_EQ(owners_work(), is_systems("/data/out/out"));
+
+  mkfifo("/data/out/pipe", 0600);
+  const int reader = open("/data/out/pipe", O_RDONLY | O_NONBLOCK);
+  EXPECT_EQ(-1, open_output("/data/out/pipe", O_WRONLY, 0600)) << "nor one that somebody reads";
+  close(reader);
+}
+
+TEST_F(Core, NoStepOnTheWayIsALink) {
+  run("mkdir -p /data/real/below && ln -s real /data/link && ln -s /data/real /cache/link");
+  EXPECT_NE(-1, open_folder("/data/real//below/"));
+  EXPECT_EQ(-1, open_folder("/data/link"));
+  EXPECT_EQ(-1, open_folder("/data/link/"));
+  EXPECT_EQ(-1, open_folder("/data/link/below"));
+  EXPECT_EQ(-1, open_output("/cache/link/file", O_WRONLY, 0600));
+  EXPECT_EQ(Texts{"below"}, list("/data/real"));
+  EXPECT_EQ(-1, open_folder(("/data/" + std::string(256, 'x') + "/y").c_str()));
+  EXPECT_EQ(ENAMETOOLONG, errno);
+  run("mv /cache /cache_of_data && ln -s cache_of_data /cache && mkdir /cache/logs");
+  EXPECT_NE(-1, open_folder("/cache/logs")) << "but above what only the system can replace";
+  run("rm /cache && rm -r /cache_of_data");
 }
 
 }  // namespace

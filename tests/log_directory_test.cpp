@@ -5,6 +5,7 @@
 
 #include "core/state.h"
 #include "storage/capture_paths.h"
+#include "storage/delete.h"
 #include "storage/mkdirs.h"
 #include "tests/device_root.h"
 
@@ -94,6 +95,22 @@ TEST_F(LogDirectory, TheProcessEndsWhenItCannotBeUsed) {
       log.has("corvexd: bytes_write is -1, versionNumber is existing now! Error: No space "
               "left on device \n"));
   umount("/data/corvex");
+}
+
+// A link is not the root that it leads to, whoever made it.
+TEST_F(LogDirectory, NothingIsDoneInARootThatIsALink) {
+  run("mkdir -p /data/elsewhere/KVBR_1_current && rmdir /data/corvex && "
+      "ln -s elsewhere /data/corvex");
+  renameLastDirectoryName();
+  EXPECT_EQ(1, status_in_child(createLogDirectory));
+  EXPECT_TRUE(log.has("corvexd: pdir is null! \n"));
+  EXPECT_EQ(1u, log.count("/versionNumber Error：Not a directory\n"));
+  EXPECT_EQ(-1, deleteLog("/data/corvex"));
+  EXPECT_TRUE(log.has("corvexd: opendir /data/corvex  Not a directory \n "));
+  EXPECT_EQ(-1, deleteLog("/data/corvex/"));
+  EXPECT_EQ(-1, mkdirs("/data/corvex/new/directory"));
+  EXPECT_EQ(Texts{"KVBR_1_current"}, list("/data/elsewhere"));
+  EXPECT_FALSE(is_systems("/data/elsewhere"));
 }
 
 TEST_F(LogDirectory, MkdirsMakesWhatIsMissing) {

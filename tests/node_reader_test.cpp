@@ -119,6 +119,27 @@ TEST_F(Reader, RotationPassesOverGapsAndGoesOnPastTwoGibibytes) {
   EXPECT_EQ("1", read_file("/data/log/kernel.log.3"));
 }
 
+TEST_F(Reader, NoFileOfTheSeriesLeadsOutOfIt) {
+  write_file("/probe/target", "target");
+  run("cd /data/log && ln -s /probe/target qsee.log && ln -s /probe/target kernel.log.1 && "
+      "ln /probe/target kernel.log.3");
+  write_file("/data/source", numbered(100));
+  start(kQseeReader, "/data/source");
+  EXPECT_EQ(1, end());
+  EXPECT_TRUE(
+      log.has("corvexd: Open /data/log/qsee.log Error Too many levels of symbolic links\n"));
+  strcpy(kernel_logsize, "1");
+  int64_t total = 4095;
+  int count = 3;
+  rotateKernelLog(&total, &count, 1);
+  EXPECT_EQ((Texts{"kernel.log", "kernel.log.2", "kernel.log.4", "qsee.log"}), list("/data/log"));
+  EXPECT_EQ("target", read_file("/probe/target"));
+  EXPECT_FALSE(is_systems("/probe/target"));
+  run("mv /data/log /data/other && ln -s other /data/log && rm /data/other/kernel.log");
+  EXPECT_EQ(1, status_in_child([&] { rotateKernelLog(&total, &count, 4096); }));
+  EXPECT_EQ((Texts{"kernel.log.2", "kernel.log.4", "qsee.log"}), list("/data/other"));
+}
+
 TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
   strcpy(kernel_logsize, "20480");
   mkfifo("/data/source", 0600);

@@ -86,7 +86,7 @@ Line sample() {
 }
 
 void append_line(const char* file, const Line& line) {
-  unique_fd fd(open_with_mode(file, O_WRONLY | O_APPEND, kRecordMode));
+  const unique_fd fd = open_output(file, O_WRONLY | O_APPEND, kRecordMode);
   if (fd == -1) return;
   ssize_t ignored = TEMP_FAILURE_RETRY(write(fd, line.c_str(), strlen(line.c_str())));
   (void)ignored;

@@ -1,0 +1,48 @@
+// Directories, reached so that nobody who can write in one of them leads the daemon elsewhere.
+#pragma once
+
+#include <android-base/unique_fd.h>
+#include <dirent.h>
+#include <limits.h>
+#include <sys/stat.h>
+
+#include <memory>
+
+namespace corvexd {
+
+// A name in an open directory. The daemon reaches through one whatever it makes, changes or
+// deletes.
+struct Place {
+  android::base::unique_fd folder;  // for names in it only; -1 with errno set: not reached
+  char name[NAME_MAX + 1];
+};
+
+// The place that `path` names, whether or not something is there. A "/" at the end changes nothing.
+// Follows no link below the directories that only the system can replace.
+Place locate(const char* path);
+
+// Open a directory, never what a link names: by its path, as locate() finds it, or as an entry of
+// the directory `parent`. Close-on-exec; -1 with errno set on failure.
+android::base::unique_fd open_folder(const char* path);
+android::base::unique_fd open_folder_at(int parent, const char* name);
+
+// Makes a directory with exactly `mode`, whatever umask the daemon was started with, and opens it.
+// The umask stays as it is: children inherit it. -1 with errno set on failure.
+android::base::unique_fd make_folder(int parent, const char* name, mode_t mode);
+
+struct CloseDirectory {
+  void operator()(DIR* directory) const { closedir(directory); }
+};
+using Directory = std::unique_ptr<DIR, CloseDirectory>;
+
+// Open a directory for listing, as above; null with errno set on failure.
+Directory open_directory(const char* path);
+Directory open_directory_at(int parent, const char* name);
+
+// The next entry that is neither "." nor ".."; null at the end. Valid until the next call.
+struct dirent* next_entry(const Directory& directory);
+
+// Whether the entry itself (not what a link names) is a directory.
+bool is_directory(const Directory& directory, const struct dirent& entry);
+
+}  // namespace corvexd
