@@ -5,8 +5,6 @@
 #include <string.h>
 #include <unistd.h>
 
-#include <string>
-
 #include "fs_mgr/fs_mgr_flags.h"
 #include "fs_mgr/fs_mgr_fstab.h"
 
@@ -63,22 +61,27 @@ constexpr uint32_t kDefaultNamesMode = 3;
 // Numbers are read at the widest and kept in the width of their field.
 long long integer(const char* text) { return strtoll(text, nullptr, 0); }
 
-void replace(char** text, const char* value) {
+// Makes one of the values' texts a copy of the first `length` characters.
+void replace(char** text, const char* value, size_t length, fs_mgr_flag_values* values) {
   free(*text);
-  *text = strdup(value);
+  *text = strndup(value, length);
+  if (*text == nullptr) values->incomplete = true;
+}
+
+void replace(char** text, const char* value, fs_mgr_flag_values* values) {
+  replace(text, value, strlen(value), values);
 }
 
 void store_encryption(const char* argument, fs_mgr_flag_values* values) {
   const char* colon = strchr(argument, ':');
-  if (colon == nullptr) {
-    values->file_contents_mode = encryption_mode_to_flag(kContentsModes, argument, "file contents");
-    values->file_names_mode = kDefaultNamesMode;
-    return;
-  }
-  const std::string contents(argument, colon);
-  values->file_contents_mode =
-      encryption_mode_to_flag(kContentsModes, contents.c_str(), "file contents");
-  values->file_names_mode = encryption_mode_to_flag(kNamesModes, colon + 1, "file names");
+  char* contents = nullptr;
+  replace(&contents, argument, strcspn(argument, ":"), values);
+  if (contents == nullptr) return;
+  values->file_contents_mode = encryption_mode_to_flag(kContentsModes, contents, "file contents");
+  values->file_names_mode = colon == nullptr
+                                ? kDefaultNamesMode
+                                : encryption_mode_to_flag(kNamesModes, colon + 1, "file names");
+  free(contents);
 }
 
 void store_managed_volume(const char* argument, fs_mgr_flag_values* values) {
@@ -87,7 +90,7 @@ void store_managed_volume(const char* argument, fs_mgr_flag_values* values) {
     LOG(ERROR) << "[libfs_mgr]Warning: voldmanaged= flag malformed";
     return;
   }
-  replace(&values->label, std::string(argument, colon).c_str());
+  replace(&values->label, argument, colon - argument, values);
   const char* partition = colon + 1;
   values->partition_number =
       strcmp(partition, "auto") == 0 ? -1 : static_cast<int32_t>(integer(partition));
@@ -133,16 +136,18 @@ struct Parameter {
 };
 
 const Parameter kParameters[] = {
-    {"encryptable=", [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_location, a); }},
-    {"forceencrypt=", [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_location, a); }},
+    {"encryptable=", [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_location, a, v); }},
+    {"forceencrypt=",
+     [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_location, a, v); }},
     {"fileencryption=", store_encryption},
     {"forcefdeorfbe=",
      [](const char* a, fs_mgr_flag_values* v) {
-       replace(&v->key_location, a);
+       replace(&v->key_location, a, v);
        v->file_contents_mode = kDefaultContentsMode;
        v->file_names_mode = kDefaultNamesMode;
      }},
-    {"keydirectory=", [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_directory, a); }},
+    {"keydirectory=",
+     [](const char* a, fs_mgr_flag_values* v) { replace(&v->key_directory, a, v); }},
     {"voldmanaged=", store_managed_volume},
     {"length=", [](const char* a, fs_mgr_flag_values* v) { v->length = integer(a); }},
     {"swapprio=",
@@ -154,7 +159,7 @@ const Parameter kParameters[] = {
      [](const char* a, fs_mgr_flag_values* v) {
        v->max_comp_streams = static_cast<int32_t>(integer(a));
      }},
-    {"verify", [](const char* a, fs_mgr_flag_values* v) { replace(&v->verity_location, a); }},
+    {"verify", [](const char* a, fs_mgr_flag_values* v) { replace(&v->verity_location, a, v); }},
     {"reservedsize=",
      [](const char* a, fs_mgr_flag_values* v) { v->reserved_size = size_with_suffix(a); }},
     {"eraseblk=",

@@ -49,7 +49,10 @@ class Lines {
   size_t capacity_ = 0;
 };
 
-char* copy_or_null(const char* text) { return *text == '\0' ? nullptr : strdup(text); }
+bool copy(const char* text, char** copied) {
+  *copied = strdup(text);
+  return *copied != nullptr;
+}
 
 void take_values(const fs_mgr_flag_values& values, fstab_entry* entry) {
   entry->key_location = values.key_location;
@@ -78,30 +81,27 @@ char* next_field(char* line, char** position, const char* what) {
 bool parse_entry(char* line, fstab_entry* entry) {
   char* position = nullptr;
   char* field = next_field(line, &position, "mount source");
-  if (field == nullptr) return false;
-  entry->mount_source = strdup(field);
+  if (field == nullptr || !copy(field, &entry->mount_source)) return false;
 
   field = next_field(nullptr, &position, "mount_point");
-  if (field == nullptr) return false;
-  entry->mount_point = strdup(field);
+  if (field == nullptr || !copy(field, &entry->mount_point)) return false;
 
   field = next_field(nullptr, &position, "fs_type");
-  if (field == nullptr) return false;
-  entry->fs_type = strdup(field);
+  if (field == nullptr || !copy(field, &entry->fs_type)) return false;
 
   field = next_field(nullptr, &position, "mount_flags");
   if (field == nullptr) return false;
   char options[kMountOptionsSize];
   entry->mount_flags = static_cast<uint64_t>(
       static_cast<int64_t>(parse_flags(field, kMountOptions, nullptr, options, sizeof options)));
-  entry->mount_options = copy_or_null(options);
+  if (*options != '\0' && !copy(options, &entry->mount_options)) return false;
 
   field = next_field(nullptr, &position, "fs_mgr_options");
   if (field == nullptr) return false;
   fs_mgr_flag_values values;
   entry->fs_mgr_flags = parse_flags(field, kFsMgrOptions, &values, nullptr, 0);
   take_values(values, entry);
-  return true;
+  return !values.incomplete;
 }
 
 int count_entries(Lines& lines) {
@@ -110,7 +110,7 @@ int count_entries(Lines& lines) {
   return count;
 }
 
-// Fills the entries that were counted; false when a line is no entry.
+// Fills the entries that were counted; false when a line is no entry, or there are fewer by now.
 bool parse_entries(Lines& lines, fstab* table) {
   int filled = 0;
   while (char* line = lines.next_entry()) {
@@ -121,7 +121,7 @@ bool parse_entries(Lines& lines, fstab* table) {
     if (!parse_entry(line, &table->entries[filled])) return false;
     ++filled;
   }
-  return true;
+  return filled == table->entry_count;
 }
 
 void free_entry(const fstab_entry& entry) {
@@ -149,8 +149,7 @@ fstab* fs_mgr_read_fstab_file(FILE* file) {
   table->entries = static_cast<fstab_entry*>(calloc(count, sizeof(fstab_entry)));
   if (table->entries == nullptr) return nullptr;
   table->entry_count = count;
-  rewind(file);
-  if (!parse_entries(lines, table.get())) return nullptr;
+  if (fseeko(file, 0, SEEK_SET) != 0 || !parse_entries(lines, table.get())) return nullptr;
   if (!fs_mgr_update_for_slotselect(table.get())) {
     LOG(ERROR) << kPrefix << "Error updating for slotselect";
     return nullptr;
@@ -165,8 +164,8 @@ bool fs_mgr_update_for_slotselect(fstab* table) {
     if ((entry.fs_mgr_flags & kSlotSelectFlag) == 0) continue;
     if (suffix.empty()) suffix = fs_mgr_get_slot_suffix();
     if (suffix.empty()) return false;
-    char* source = strdup((entry.mount_source + suffix).c_str());
-    if (source == nullptr) return false;
+    char* source;
+    if (asprintf(&source, "%s%s", entry.mount_source, suffix.c_str()) == -1) return false;
     free(entry.mount_source);
     entry.mount_source = source;
   }
@@ -179,14 +178,13 @@ fstab* fs_mgr_read_fstab(const char* path) {
     PLOG(ERROR) << kPrefix << "fs_mgr_read_fstab(): cannot open file: '" << path << "'";
     return nullptr;
   }
-  fstab* table = fs_mgr_read_fstab_file(file);
+  Table table(fs_mgr_read_fstab_file(file));
   fclose(file);
-  if (table == nullptr) {
+  if (table == nullptr || !copy(path, &table->source_path)) {
     LOG(ERROR) << kPrefix << "fs_mgr_read_fstab(): failed to load fstab from : '" << path << "'";
     return nullptr;
   }
-  table->source_path = strdup(path);
-  return table;
+  return table.release();
 }
 
 void fs_mgr_free_fstab(fstab* table) {

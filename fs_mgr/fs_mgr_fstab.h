@@ -39,7 +39,8 @@ struct fstab {
 constexpr int32_t kForceEncryptFlag = 0x400;
 
 // Reads the table at `path`, which the caller releases with fs_mgr_free_fstab. Null (logged) when
-// the file cannot be opened or read, holds no entry, or one of fewer than five fields. Any thread.
+// the file cannot be opened or read, holds no entry, or one of fewer than five fields, shrinks
+// while it is read, or memory is lacking. Any thread.
 struct fstab* fs_mgr_read_fstab(const char* path);
 
 // Releases a table with all it owns; null is allowed.
@@ -74,6 +75,7 @@ struct fs_mgr_flag_values {
   uint32_t file_names_mode;
   uint32_t erase_block_size;
   uint32_t logical_block_size;
+  bool incomplete;  // memory for a text was lacking
 };
 
 struct fstab* fs_mgr_read_fstab_file(FILE* file);

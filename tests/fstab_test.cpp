@@ -1,7 +1,9 @@
 #include "fs_mgr/fs_mgr_fstab.h"
 
 #include <android-base/properties.h>
+#include <stdlib.h>
 #include <sys/mount.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <memory>
@@ -102,9 +104,14 @@ TEST_F(Fstab, OptionsSetTheirParameters) {
       {"zramsize=50%", "0x100 zram:" + std::to_string(static_cast<uint32_t>(memory))},
       {"reservedsize=128M", "0x200000 reserved:134217728"},
       {"reservedsize=7kM", "0x200000 reserved:7168"},
+      {"reservedsize=3K", "0x200000 reserved:3072"},
+      {"reservedsize=2m", "0x200000 reserved:2097152"},
+      {"reservedsize=1G", "0x200000 reserved:1073741824"},
+      {"reservedsize=5g", "0x200000 reserved:5368709120"},
+      {"reservedsize=9T", "0x200000 reserved:9"},
       {"reservedsize=0x10", "0x200000"},
       {"eraseblk=0x1000,logicalblk=8192", "0x1800000 erase:4096 logical:8192"},
-      {"eraseblk=1000,logicalblk=4097", "0x1800000"},
+      {"eraseblk=2048,logicalblk=4097", "0x1800000"},
   };
   for (const auto& [options, expected] : rows) {
     Table table = read("/dev/a /a ext4 ro " + std::string(options));
@@ -139,9 +146,78 @@ TEST_F(Fstab, WhatIsNoTableIsRefusedWithItsReason) {
     EXPECT_EQ(nullptr, read(content)) << content;
     EXPECT_EQ((Texts{line, kReading + "failed to load fstab from : '/data/fstab'"}), log.texts());
   }
+  const size_t open_files = list("/proc/self/fd").size();
   EXPECT_EQ(nullptr, fs_mgr_read_fstab("/data/none"));
+  EXPECT_EQ(nullptr, read("a b"));
+  EXPECT_NE(nullptr, read("a b c d e"));
+  EXPECT_EQ(open_files, list("/proc/self/fd").size());
   EXPECT_TRUE(log.has(kReading + "cannot open file: '/data/none': No such file or directory"));
 }
+
+// A source that is not the same at its second reading, or has none.
+struct Source {
+  std::string passes[2];
+  bool rewinds;
+  int pass = 0;
+  size_t offset = 0;
+};
+
+Table read_source(Source source) {
+  cookie_io_functions_t functions = {};
+  functions.read = [](void* cookie, char* buffer, size_t size) -> ssize_t {
+    auto& from = *static_cast<Source*>(cookie);
+    const size_t count = from.passes[from.pass].copy(buffer, size, from.offset);
+    from.offset += count;
+    return static_cast<ssize_t>(count);
+  };
+  functions.seek = [](void* cookie, off64_t*, int) {
+    auto& from = *static_cast<Source*>(cookie);
+    from.pass = 1;
+    from.offset = 0;
+    return from.rewinds ? 0 : -1;
+  };
+  FILE* file = fopencookie(&source, "r", functions);
+  setvbuf(file, nullptr, _IONBF, 0);
+  Table table(fs_mgr_read_fstab_file(file), fs_mgr_free_fstab);
+  fclose(file);
+  return table;
+}
+
+TEST_F(Fstab, ASourceThatChangesIsNoTableUnlessItGrows) {
+  const std::string one = "/dev/a /a ext4 ro wait\n", two = one + "/dev/b /b ext4 ro wait\n";
+  const Table grown = read_source({{one, two + two}, true});
+  ASSERT_NE(nullptr, grown);
+  EXPECT_EQ(1, grown->entry_count);
+  EXPECT_EQ(Texts{"[libfs_mgr]Tried to process more entries than counted"}, log.texts());
+  EXPECT_EQ(nullptr, read_source({{two, one}, true}));
+  EXPECT_EQ(nullptr, read_source({{one, ""}, true}));
+  EXPECT_EQ(nullptr, read_source({{one, one}, false}));
+}
+
+#ifndef CORVEX_SANITIZED  // their allocators end the program instead
+// There is memory for the line, but not for a copy of its longest field, which is larger than what
+// the C library may still hold in reserve.
+TEST_F(Fstab, LackOfMemoryIsNoTable) {
+  constexpr rlim_t kField = 70 << 20, kLine = 126 << 20;
+  const std::pair<const char*, const char*> rows[] = {
+      {"/dev/a ", " ext4 ro wait\n"},
+      {"/dev/a /a ext4 ro verify=", "\n"},
+      {"/dev/a /a ext4 ro voldmanaged=", ":1\n"},
+      {"/dev/a /a ext4 ro fileencryption=", ":x\n"},
+  };
+  for (const auto& [start, end] : rows) {
+    write_file("/data/fstab", start + std::string(kField, 'x') + end);
+    EXPECT_EQ(0, status_in_child([] {
+                const long pages = atol(read_file("/proc/self/statm").c_str());
+                const rlim_t used = pages * sysconf(_SC_PAGESIZE);
+                const struct rlimit memory = {used + kLine + kField / 2, RLIM_INFINITY};
+                setrlimit(RLIMIT_AS, &memory);
+                _exit(fs_mgr_read_fstab("/data/fstab") == nullptr ? 0 : 1);
+              }))
+        << start;
+  }
+}
+#endif
 
 class BootConfig : public DeviceTest {
  protected:
