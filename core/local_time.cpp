@@ -8,6 +8,7 @@ struct tm local_time() {
   time_t now = time(nullptr);
   struct tm local = {};
   std::lock_guard<std::mutex> lock(local_time_mutex);
+  tzset();  // the phone may have learned its zone since the last time
   localtime_r(&now, &local);
   return local;
 }

@@ -2,10 +2,12 @@
 
 #include <errno.h>
 #include <fcntl.h>
+#include <stdlib.h>
 #include <unistd.h>
 
 #include "core/directory.h"
 #include "core/files.h"
+#include "core/local_time.h"
 #include "core/state.h"
 #include "tests/device_root.h"
 
@@ -92,6 +94,14 @@ TEST_F(Core, AnOutputIsARegularFileThatNoLinkLeadsTo) {
   const int reader = open("/data/out/pipe", O_RDONLY | O_NONBLOCK);
   EXPECT_EQ(-1, open_output("/data/out/pipe", O_WRONLY, 0600)) << "nor one that somebody reads";
   close(reader);
+}
+
+TEST_F(Core, LocalTimeFollowsTheZone) {
+  setenv("TZ", "<-0930>9:30", 1);
+  EXPECT_EQ(-9.5 * 3600, local_time().tm_gmtoff);
+  setenv("TZ", "<+0545>-5:45", 1);
+  EXPECT_EQ(5.75 * 3600, local_time().tm_gmtoff);
+  unsetenv("TZ");
 }
 
 TEST_F(Core, NoStepOnTheWayIsALink) {
