@@ -91,7 +91,8 @@ void copy_source(const NodeReader& reader, const char* path) {
   Counters counters;
   // Not NUL, so that the line says what happened when nothing has been read at all.
   char block[kBlockSize] = {'\xff'};
-  for (int reads = 0; reader.max_reads == 0 || reads < reader.max_reads; ++reads) {
+  // A source that stays empty is read more often than an int can tell.
+  for (int64_t reads = 0; reader.max_reads == 0 || reads < reader.max_reads; ++reads) {
     ssize_t size = read(*reader.from_fd, block, sizeof block);
     if (reader.erases_source && block[0] == '\0') {
       log_error("%s", reader.texts.empty_block);
@@ -132,10 +133,10 @@ void run_node_reader(const NodeReader& reader) {
 
 void cat_kernel_from_dev() { run_node_reader(kKernelReader); }
 
-void rotateKernelLog(int64_t* total, int* count, int written) {
+void rotateKernelLog(int* total, int* count, int written) {
   Counters counters = {*total, *count};
   rotate_when_due(kKernelReader, kKernelReader.output->get().c_str(), &counters, written);
-  *total = counters.total;
+  *total = static_cast<int>(counters.total);
   *count = counters.count;
 }
 

@@ -57,7 +57,7 @@ void cat_kernel_from_dev();
 
 // Adds `written` bytes to the kernel log's *total and, when that has passed one more multiple of
 // its size limit, shifts the series of files by one suffix, begins a fresh file and counts the
-// rotation in *count. In the reader's child.
-void rotateKernelLog(int64_t* total, int* count, int written);
+// rotation in *count. In the reader's child; the reader itself counts in 64 bits.
+void rotateKernelLog(int* total, int* count, int written);
 
 }  // namespace corvexd
