@@ -58,6 +58,7 @@ class SlotLock {
 void begin_start(ChildSlot& slot) {
   SlotLock lock;
   starting = true;
+  slot.status = 0;
   if (slot.known) return;
   slot.known = true;
   slot.next = known_slots;
@@ -109,10 +110,21 @@ void deliver() {
   log_error("corvexd: stop_logcat : %d, pid = %d\n", stop_logcat.load(), reaped);
 }
 
+// Ends that came together were delivered as one, and each delivery reaps one child. Without this
+// the rest would pile up, capture after capture.
+void deliver_what_was_merged() {
+  siginfo_t ended = {};
+  while (waitid(P_ALL, 0, &ended, WEXITED | WNOHANG | WNOWAIT) == 0 && ended.si_pid != 0) {
+    sig_chld_handler(SIGCHLD);
+    ended = {};
+  }
+}
+
 }  // namespace
 
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument) {
   local_time_mutex.lock();
+  deliver_what_was_merged();
   begin_start(slot);
   pid_t result = fork();
   int error = errno;

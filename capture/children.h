@@ -11,7 +11,7 @@ namespace corvexd {
 struct ChildSlot {
   int32_t pid = 0;       // what the latest fork returned; -1 when it failed, 0 for none
   bool running = false;  // false once the child has been reaped: its number may be another's now
-  int status = 0;        // the wait status of a child that has been reaped
+  int status = 0;        // the wait status of a child that has been reaped; 0 until then
   bool known = false;
   ChildSlot* next = nullptr;
 };
@@ -19,8 +19,9 @@ struct ChildSlot {
 // Forks. The child runs body(argument) and ends with status 1 if that returns; it must not return
 // into the starter's sequence in any other way, nor wait for a lock that another thread may hold
 // (allocation and local_timestamp are safe). The parent does not wait; the result of the fork is
-// in the slot (errno is the fork's), whose earlier child, if any, goes on unobserved. Any thread; a
-// slot belongs to one.
+// in the slot (errno is the fork's), whose earlier child, if any, goes on unobserved. Children that
+// have ended are reaped first, as by one delivery of SIGCHLD each. Any thread; a slot belongs to
+// one.
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument);
 
 // Replaces the calling child by a program with the daemon's environment; ends it with status 1

@@ -2,6 +2,7 @@
 
 #include <signal.h>
 
+#include <algorithm>
 #include <chrono>
 
 #include "tests/daemon.h"
@@ -93,6 +94,20 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
   EXPECT_TRUE(eventually([&] { return has_ended(second[5].pid); }));
   EXPECT_TRUE(lives(first[2])) << "the slot names the second capture's recorder";
   EXPECT_TRUE(exists(first_directory.substr(0, first_directory.size() - 8)));
+}
+
+// Ends that come together are delivered as one, which reaps one.
+TEST_F(Capture, EndedRecordersDoNotPileUp) {
+  switch_on({"main", "radio", "event", "kernel", "tcpdump", "qsee", "tz", "bootloader"});
+  Daemon daemon(log);
+  const std::string children = "/proc/" + std::to_string(daemon.pid()) + "/task/" +
+                               std::to_string(daemon.pid()) + "/children";
+  const auto count = [&] {
+    const std::string all = read_file(children);
+    return std::count(all.begin(), all.end(), ' ');
+  };
+  for (int i = 0; i < 12; ++i) send_commands({"LOGBEGIN", "LOGSTOP"});
+  EXPECT_LE(count(), 4 + 8 + 1) << "boot recorders, the last capture's, the last dump";
 }
 
 TEST_F(Capture, TakesItsTwoSecondsThoughRecordersEndMeanwhile) {
