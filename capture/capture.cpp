@@ -9,7 +9,6 @@
 #include "core/pause.h"
 #include "core/thread.h"
 #include "storage/capture_paths.h"
-#include "storage/current_directory.h"
 #include "storage/earlier_logs.h"
 #include "storage/log_directory.h"
 
@@ -53,11 +52,7 @@ void close_slot(int32_t* descriptor) {
 }  // namespace
 
 void begin_capture() {
-  {
-    std::lock_guard<std::mutex> lock(current_directory_mutex);
-    renameLastDirectoryName();
-    createLogDirectory();
-  }
+  begin_log_directory();
   makeLogAbsolutePath();
   executeLogcat();
 }

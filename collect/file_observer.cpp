@@ -77,15 +77,29 @@ bool holds(const char* name, const char* part) { return strstr(name, part) != nu
 
 bool is_trace(const char* name) { return holds(name, "trace") || holds(name, "anr_"); }
 
-void complete_trace(const ObserverState& state, const char* name) {
+// Opens the directory of the latest trace. A capture that has begun since then has taken the mark
+// away from the log directory above it.
+unique_fd open_anr_directory(LongPath* path) {
+  std::lock_guard<std::mutex> lock(current_directory_mutex);
+  unique_fd folder = open_folder(path->c_str());
+  const char* mark = strstr(path->c_str(), kCurrentMark);
+  if (folder != -1 || mark == nullptr) return folder;
+  LongPath renamed;
+  renamed.append(path->c_str(), mark - path->c_str()).append(mark + strlen(kCurrentMark));
+  folder = open_folder(renamed.c_str());
+  if (folder != -1) *path = renamed;
+  return folder;
+}
+
+void complete_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
   if (*state.anr_directory.c_str() == '\0') return;
+  const unique_fd traces = open_folder(kTraces);
+  const unique_fd folder = open_anr_directory(&state.anr_directory);
   LongPath source, target(state.anr_directory);
   source.append(kTraces).append("/").append(name);
   target.append("/").append(name);
   const char* target_name = strrchr(target.c_str(), '/') + 1;
-  const unique_fd traces = open_folder(kTraces);
-  const unique_fd folder = open_folder(state.anr_directory.c_str());
   if (faccessat(folder, target_name, R_OK, 0) == 0 && unlinkat(folder, target_name, 0) != 0) {
     log_error("corvexd: can't remove %s'", target.c_str());
   }
@@ -126,7 +140,7 @@ void begin_trace(ObserverState& state, const char* name) {
   dump_input(folder, directory);
 }
 
-void handle_closed(const ObserverState& state, const char* name) {
+void handle_closed(ObserverState& state, const char* name) {
   for (const ClosedArtefact& artefact : kClosedArtefacts) {
     if (!holds(name, artefact.in_name)) continue;
     movefile(artefact.directory, name);

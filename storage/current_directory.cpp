@@ -26,7 +26,7 @@ bool find_current_directory(WhichMark which, Path* path) {
   if (!root) return false;
   bool found = false;
   while (struct dirent* entry = next_entry(root)) {
-    if (strstr(entry->d_name, "_current") == nullptr || !is_directory(root, *entry)) continue;
+    if (strstr(entry->d_name, kCurrentMark) == nullptr || !is_directory(root, *entry)) continue;
     if (which == WhichMark::kFirstPlain && !is_plain_word(entry->d_name)) continue;
     const Path candidate = Path().append(root_path).append("/").append(entry->d_name);
     if (!candidate.fits_or_log()) continue;

@@ -7,12 +7,15 @@
 
 namespace corvexd {
 
+// What the name of the current log directory ends with until the next one is made.
+constexpr char kCurrentMark[] = "_current";
+
 // Normally one directory bears the mark; when there are more, jobs differ in which one they take,
 // in the order of the listing. A name that is to stand in a shell line must mean itself there:
 // others than the daemon can make directories, too.
 enum class WhichMark { kFirst, kFirstPlain, kLast };
 
-// Sets *path to the directory under LOG_ROOT whose name holds "_current". Any thread. False, with
+// Sets *path to the directory under LOG_ROOT whose name holds the mark. Any thread. False, with
 // *path untouched, when the root cannot be opened (errno says why) or holds none to be taken
 // (errno is 0). A marked directory whose path does not fit is logged and passed over.
 bool find_current_directory(WhichMark which, Path* path);

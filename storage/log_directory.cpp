@@ -16,6 +16,7 @@
 #include "core/path_buffer.h"
 #include "core/state.h"
 #include "storage/copy.h"
+#include "storage/current_directory.h"
 #include "storage/mkdirs.h"
 
 using android::base::unique_fd;
@@ -23,8 +24,8 @@ using android::base::unique_fd;
 namespace corvexd {
 namespace {
 
-constexpr char kCurrentMark[] = "_current";
 constexpr char kDirectoryMark[] = "KVBR_";
+constexpr char kVersionFile[] = "versionNumber";
 constexpr mode_t kVersionFileMode = 0600;
 
 void remove_mark(const Directory& root, const char* name) {
@@ -66,17 +67,27 @@ Path next_log_directory() {
   return path.append(time.c_str()).append(kCurrentMark);
 }
 
+// Ends the daemon, and leaves no directory behind: started again on storage that is full, it would
+// fill that with directories.
+[[noreturn]] void give_up(const Path& directory) {
+  const Place place = locate(directory.c_str());
+  const unique_fd folder = open_folder_at(place.folder, place.name);
+  unlinkat(folder, kVersionFile, 0);
+  unlinkat(place.folder, place.name, AT_REMOVEDIR);
+  end_daemon();
+}
+
 // Opens the version file of the log directory and writes the build's name, a property value with
 // the rest of its buffer. The file stays open until the markers are copied.
 unique_fd write_version(const Path& directory) {
-  Path path = Path(directory).append("/versionNumber");
+  Path path = Path(directory).append("/").append(kVersionFile);
   log_info("corvexd: vn is %s \n", path.c_str());
   char version[PROPERTY_VALUE_MAX] = {};
   property_get("ro.build.ota.versionname", version, "");
   unique_fd fd = open_output(path.c_str(), O_WRONLY, kVersionFileMode);
   if (fd == -1) {
     log_error("corvexd: Open %s Error：%s\n", path.c_str(), strerror(errno));
-    end_daemon();
+    give_up(directory);
   }
   give_to_system(fd);
   for (size_t done = 0; done < sizeof version;) {
@@ -85,7 +96,7 @@ unique_fd write_version(const Path& directory) {
     if (count == -1) {
       log_error("corvexd: bytes_write is -1, versionNumber is existing now! Error: %s \n",
                 strerror(errno));
-      end_daemon();
+      give_up(directory);
     }
     done += count;
   }
@@ -96,9 +107,7 @@ void copy_marker(const Path& source, const Path& destination) {
   if (access(source.c_str(), R_OK) == 0) copy_file(source.c_str(), destination.c_str());
 }
 
-}  // namespace
-
-void renameLastDirectoryName() {
+void remove_marks() {
   Directory root = open_directory(LOG_ROOT);
   if (!root) {
     log_error("corvexd: Error: %s\n", strerror(errno));
@@ -111,7 +120,7 @@ void renameLastDirectoryName() {
   }
 }
 
-int createLogDirectory() {
+int make_log_directory() {
   cache_file_path.clear().append(cache_path).append("fileAfter911");
   const Path after_source = cache_file_path;
   cache_file_path.clear().append(cache_path).append("fileBefore911");
@@ -129,6 +138,32 @@ int createLogDirectory() {
   copy_marker(before_source, Path(directory).append("/fileBefore911"));
   version_file.reset();
   return mkdirs(Path(directory).append("/boot_log").c_str());
+}
+
+}  // namespace
+
+void renameLastDirectoryName() {
+  std::lock_guard<std::mutex> lock(current_directory_mutex);
+  remove_marks();
+}
+
+int createLogDirectory() {
+  std::lock_guard<std::mutex> lock(current_directory_mutex);
+  return make_log_directory();
+}
+
+void begin_log_directory() {
+  std::lock_guard<std::mutex> lock(current_directory_mutex);
+  remove_marks();
+  make_log_directory();
+}
+
+Path provide_current_directory() {
+  std::lock_guard<std::mutex> lock(current_directory_mutex);
+  Path path;
+  if (find_current_directory(WhichMark::kFirst, &path)) return path;
+  make_log_directory();
+  return LOG_DIR.get();
 }
 
 }  // namespace corvexd

@@ -1,7 +1,11 @@
 // The numbered log directories under the log root.
 #pragma once
 
+#include "core/path_buffer.h"
+
 namespace corvexd {
+
+// Each of these takes current_directory_mutex for itself.
 
 // Removes the "_current" mark (the last 8 characters of the name) from every directory under the
 // log root that bears it. Main thread. Failures are logged; such a directory keeps its name.
@@ -12,5 +16,11 @@ void renameLastDirectoryName();
 // or -1). Ends the process with status 1 when the directory cannot take its first file: without
 // one the daemon is of no use, and init starts it again.
 int createLogDirectory();
+
+// The two in one, so that no artefact finds no mark, or two: what every capture begins with.
+void begin_log_directory();
+
+// The directory that bears the mark, made when there is none. Main thread.
+Path provide_current_directory();
 
 }  // namespace corvexd

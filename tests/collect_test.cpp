@@ -14,6 +14,7 @@
 #include "collect/artefact_mover.h"
 #include "collect/file_observer.h"
 #include "core/state.h"
+#include "storage/log_directory.h"
 #include "tests/daemon.h"
 #include "tests/device_root.h"
 #include "tests/files.h"
@@ -263,15 +264,54 @@ TEST_F(Collect, AReportGoesWhereNoNameIsACommand) {
   EXPECT_FALSE(exists("/pwned") || exists("/data/corvex/pwned"));
 }
 
+TEST_F(Collect, ATraceThatACaptureComesBetweenIsKept) {
+  write_script("/system/bin/dumpsys", "sleep 0.2; echo dumped $1");
+  Observer daemon(log);
+  const std::string first = current_directory();
+  const int trace = open("/data/anr/anr_1", O_WRONLY | O_CREAT, 0644);
+  EXPECT_TRUE(eventually([&] { return files_below(first).count("anr/TIME/state") == 1; }));
+  send_commands({"LOGBEGIN"});
+  EXPECT_EQ(5, write(trace, "trace", 5));
+  close(trace);
+  const std::string unmarked = first.substr(0, first.size() - strlen("_current"));
+  EXPECT_TRUE(eventually([&] {
+    auto files = files_below(unmarked);
+    return files["anr/TIME/anr_1"] == "trace" && files["anr/TIME/dumpsys_input"] != "";
+  }));
+  EXPECT_FALSE(exists(first));
+}
+
+// One event as the kernel tells it, its name cut to 16 bytes or filled up.
+std::string record(uint32_t mask, const std::string& name) {
+  struct inotify_event event = {};
+  event.mask = mask;
+  event.len = 16;
+  return std::string(reinterpret_cast<char*>(&event), sizeof event) +
+         (name + std::string(16, '\0')).substr(0, 16);
+}
+
+// A trace makes its directory where the log directory last was, although that has been deleted. The
+// many files make the search for a current directory last.
+TEST_F(Collect, ACurrentDirectoryIsMadeBesideNoOther) {
+  checkLogPath();
+  run("cd /data/corvex && seq 50000 | xargs touch");
+  LOG_DIR.set(Path().append("/data/corvex/deleted_current"));
+  std::thread observer([] {
+    usleep(1000);
+    ObserverState state;
+    const std::string created = record(IN_CREATE, "anr_1");
+    handle_events(state, created.data(), created.size());
+  });
+  const Path current = provide_current_directory();
+  observer.join();
+  EXPECT_TRUE(exists(std::string(current.c_str()) + "/anr"));
+  run("[ $(ls -d /data/corvex/*_current | wc -l) = 1 ]");
+}
+
 TEST_F(Collect, EventRecordsAreNotTrusted) {
   std::string records;
-  for (const char* name : {"sixteen_letters!", "whole", "torn"}) {
-    struct inotify_event event = {};
-    event.mask = IN_MOVED_TO;
-    event.len = 16;
-    records.append(reinterpret_cast<char*>(&event), sizeof event);
-    records.append(std::string(name).append(16, '\0'), 0, 16);  // the first has no NUL
-  }
+  for (const char* name : {"sixteen_letters!", "whole", "torn"})
+    records += record(IN_MOVED_TO, name);
   ObserverState state;
   for (size_t size = 0; size < records.size(); ++size) {
     std::vector<char> exact(records.c_str(), records.c_str() + size);  // a read past it shows

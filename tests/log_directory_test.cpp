@@ -94,6 +94,7 @@ TEST_F(LogDirectory, TheProcessEndsWhenItCannotBeUsed) {
   EXPECT_TRUE(
       log.has("corvexd: bytes_write is -1, versionNumber is existing now! Error: No space "
               "left on device \n"));
+  EXPECT_EQ(Texts{"filler"}, list("/data/corvex")) << "or a full disk would fill with directories";
   umount("/data/corvex");
 }
 

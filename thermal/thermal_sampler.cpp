@@ -12,8 +12,6 @@
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "core/pause.h"
-#include "core/state.h"
-#include "storage/current_directory.h"
 #include "storage/log_directory.h"
 #include "storage/mkdirs.h"
 
@@ -104,11 +102,7 @@ ChildSlot cpu_thermal_pid;
 
 int getCpuxThermal() {
   handle_ended_children();
-  Path path;
-  if (!find_current_directory(WhichMark::kFirst, &path)) {
-    createLogDirectory();
-    path = LOG_DIR.get();
-  }
+  Path path = provide_current_directory();
   if (!path.append(kSubdirectory).fits_or_log()) return -1;
   log_info("corvexd: cpu&thermal log path is %s \n", path.c_str());
   mkdirs(path.c_str());
