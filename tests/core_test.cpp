@@ -40,7 +40,8 @@ TEST_F(Core, LogRootFollowsItsTwoProperties) {
     const char* path;
     bool in_data;
   } rows[] = {{"", "", true},      {"false", "data", true}, {"true", "data", false},
-              {"", "Data", false}, {"", "data ", false},    {"false", "sdcard", false}};
+              {"", "Data", false}, {"", "data ", false},    {"false", "sdcard", false},
+              {"", "", true}};
   for (const auto& row : rows) {
     set_property("sys.debug.watchdog", row.watchdog);
     set_property("persist.sys.corvex.path", row.path);
