@@ -24,8 +24,8 @@
 //   waits for that very allocation.
 // - Between a fork and the storing of its result nobody can tell which slot a child belongs to.
 //   Deliveries of that moment are counted and carried out by the starter right afterwards, so a
-//   child that ends at once is still found in its slot. Two threads start children; the mutex that
-//   each holds for the fork lets one of them at a time.
+//   child that ends at once is still found in its slot. Two threads start children; each holds the
+//   mutex over the local time for it, so one start ends before the next begins.
 
 namespace corvexd {
 namespace {

@@ -1,7 +1,9 @@
 #include "capture/exec_shell.h"
 
 #include <errno.h>
+#include <fcntl.h>
 #include <paths.h>
+#include <stdio.h>
 #include <string.h>
 #include <unistd.h>
 
@@ -29,17 +31,22 @@ struct ShellStart {
 
 void run_shell(const void* argument) {
   const auto& start = *static_cast<const ShellStart*>(argument);
-  dup2(start.output, STDOUT_FILENO);
+  use_as_output(start.output);
   const char* arguments[] = {"sh", "-c", start.command, nullptr};
   exec_program(_PATH_BSHELL, arguments);
 }
 
 }  // namespace
 
+void use_as_output(int fd) {
+  dup2(fd, STDOUT_FILENO);
+  fcntl(STDOUT_FILENO, F_SETFD, 0);  // should it have been this descriptor already
+}
+
 bool start_shell(ChildSlot& slot, const char* command, unique_fd output) {
   if (output == -1) {
-    log_error("corvexd: no output for %s: %s\n", command, strerror(errno));
-    return false;
+    dprintf(STDERR_FILENO, "corvexd: no output for %s: %s\n", command, strerror(errno));
+    return true;
   }
   const ShellStart start = {command, output};
   start_child(slot, run_shell, &start);
@@ -49,18 +56,21 @@ bool start_shell(ChildSlot& slot, const char* command, unique_fd output) {
 void exec_shell(const char* command, const char* name) {
   const Path output = Path(LOG_DIR.get()).append("/").append(name);
   if (!output.fits_or_log()) return;
-  PathBuffer<512> line;
+  PathBuffer<512> line, started;
   line.append(command).append(" > ").append(output.c_str());
+  started.append(command);
   if (isInDataPartition) {
     line.append(" ; chown system:system ").append(output.c_str());
     log_info("corvexd: isInDataPartition  \n");
+  } else {
+    started.append("&");
   }
   if (!line.append("&").fits_or_log()) return;
 
   // What the line says, but that the file is opened and given away here.
   unique_fd file = open_program_output(output.c_str());
   if (file != -1) give_to_system(file);
-  if (start_shell(dump_slot, command, std::move(file))) pause_seconds(kHeadStart);
+  if (start_shell(dump_slot, started.c_str(), std::move(file))) pause_seconds(kHeadStart);
   log_info("corvexd: shell_cmd is %s \n", line.c_str());
 }
 

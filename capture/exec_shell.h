@@ -7,10 +7,13 @@
 
 namespace corvexd {
 
+// Makes an open file the standard output of the calling child and of what it runs.
+void use_as_output(int fd);
+
 // Starts `command` in a shell, a child in this slot, with `output` as its standard output. The
 // command line holds no name but the daemon's own, and no file's at all: the shell would open
-// whatever somebody has put there. Any thread. Waits for nothing; false when there is no output
-// (logged) or no child.
+// whatever somebody has put there. Any thread. Waits for nothing; false when the fork failed. An
+// output that could not be opened (errno says why) is told as a shell would, on standard error.
 bool start_shell(ChildSlot& slot, const char* command, android::base::unique_fd output);
 
 // Runs `command` through the shell with its output in the file `name` of LOG_DIR, given to the

@@ -77,33 +77,22 @@ void provide_media_marker() {
   if (marker != -1) give_to_system(marker);
 }
 
-// A file of the destination, by a path that is cut where it does not fit.
-struct Target {
-  Target(const LongPath& directory, const char* name) : path(directory) { path.append(name); }
-  const char* name() const { return strrchr(path.c_str(), '/') + 1; }
-
-  LongPath path;
-};
-
-// The destination directory and its path.
-struct Folder {
-  unique_fd fd;
-  const LongPath& path;
-};
-
-void copy_to(const Folder& folder, const CopyEnd& from) {
-  const Target target(folder.path, from.name);
-  copy_file(from, Links::kNone, {folder.fd, target.name(), target.path.c_str()});
+// `folder` is the destination directory, open; a path that does not fit is cut.
+void copy_to(int folder, const LongPath& destination, const CopyEnd& from) {
+  LongPath to(destination);
+  to.append(from.name);
+  copy_file(from, Links::kNone, {folder, strrchr(to.c_str(), '/') + 1, to.c_str()});
 }
 
 // `source` is the directory `dir`.
-void copy_artefact(int source, const char* dir, const char* name, const Folder& folder) {
+void copy_artefact(int source, const char* dir, const char* name, int folder,
+                   const LongPath& destination) {
   LongPath path;
   path.append(dir).append("/").append(name);
   struct stat status;
   bool is_folder =
       fstatat(source, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
-  if (!is_folder) return copy_to(folder, {source, name, path.c_str()});
+  if (!is_folder) return copy_to(folder, destination, {source, name, path.c_str()});
   Directory files = open_directory_at(source, name);
   if (!files) {
     log_error("corvexd: open file failure. %s", path.c_str());
@@ -113,20 +102,21 @@ void copy_artefact(int source, const char* dir, const char* name, const Folder& 
     if (is_directory(files, *entry)) continue;
     LongPath file(path);
     file.append("/").append(entry->d_name);
-    copy_to(folder, {dirfd(files.get()), entry->d_name, file.c_str()});
+    copy_to(folder, destination, {dirfd(files.get()), entry->d_name, file.c_str()});
   }
 }
 
-// Makes the destination below the current log directory, without an earlier copy where the row
-// replaces one.
-unique_fd open_destination(const Destination& row, const LongPath& path, const char* name) {
-  mkdirs(path.c_str());
-  unique_fd folder = open_folder(path.c_str());
-  const Target earlier(path, name);
-  if (row.replaces && folder != -1 && faccessat(folder, earlier.name(), R_OK, 0) == 0) {
-    unlinkat(folder, earlier.name(), 0);
+// Makes the destination below the current log directory and finds the place of the copy in it,
+// without an earlier copy where the row replaces one.
+Place provide_place(const Destination& row, const LongPath& destination, const char* name) {
+  mkdirs(destination.c_str());
+  LongPath copy(destination);
+  copy.append(name);
+  Place place = locate(copy.c_str());
+  if (row.replaces && faccessat(place.folder, place.name, R_OK, 0) == 0) {
+    unlinkat(place.folder, place.name, 0);
   }
-  return folder;
+  return place;
 }
 
 }  // namespace
@@ -147,8 +137,7 @@ int movefile(const char* dir, const char* name) {
   }
   const Destination& row = find_destination(dir, name);
   const LongPath destination = destination_path(row, current, name, time);
-  if (!destination.fits_or_log()) return -1;
-  const Folder folder = {open_destination(row, destination, name), destination};
+  const Place place = provide_place(row, destination, name);
   lock.unlock();
   log_error("corvexd: movefile: %s\n", destination.c_str());
   if (strstr(dir, "Screenshots") != nullptr) provide_media_marker();
@@ -157,7 +146,7 @@ int movefile(const char* dir, const char* name) {
     log_error("corvexd: Error: %s\n", strerror(errno));
     return -1;
   }
-  copy_artefact(source, dir, name, folder);
+  copy_artefact(source, dir, name, place.folder, destination);
   return 0;
 }
 

@@ -2,12 +2,14 @@
 
 #include <android-base/unique_fd.h>
 #include <errno.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include "capture/children.h"
+#include "capture/exec_shell.h"
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
@@ -33,10 +35,10 @@ void run_bugreport(const void*) {
   const char* path = strstr(line, kRedirection) + strlen(kRedirection);
   const unique_fd output = open_program_output(path);
   if (output == -1) {
-    log_error("corvexd: open file failure. %s", path);
+    dprintf(STDERR_FILENO, "corvexd: %s: %s\n", path, strerror(errno));
     return;
   }
-  dup2(output, STDOUT_FILENO);
+  use_as_output(output);
   const Path tool = Path().append(line, strstr(line, kRedirection) - line);
   _exit(system(tool.c_str()) == 0 ? 0 : 1);
 }

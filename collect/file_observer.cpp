@@ -8,6 +8,8 @@
 #include <sys/inotify.h>
 #include <unistd.h>
 
+#include <utility>
+
 #include "capture/exec_shell.h"
 #include "collect/artefact_mover.h"
 #include "core/directory.h"
@@ -110,7 +112,9 @@ void complete_trace(ObserverState& state, const char* name) {
 void dump_input(int folder, const LongPath& directory) {
   constexpr char kDump[] = "/system/bin/dumpsys input | xargs -0 echo";
   constexpr char kFile[] = "dumpsys_input";
-  if (start_shell(input_dump, kDump, open_program_output_at(folder, kFile))) pause_seconds(1);
+  const LongPath command = LongPath().append(kDump).append("&");
+  unique_fd output = open_program_output_at(folder, kFile);
+  if (start_shell(input_dump, command.c_str(), std::move(output))) pause_seconds(1);
   LongPath line;
   line.append(kDump).append(" > ").append(directory.c_str()).append(kFile).append("&");
   log_info("corvexd: anr_input is %s \n", line.c_str());

@@ -5,6 +5,8 @@
 #include <string.h>
 #include <unistd.h>
 
+#include <utility>
+
 using android::base::unique_fd;
 
 namespace corvexd {
@@ -36,10 +38,9 @@ Directory list_folder(unique_fd folder) {
   return directory;
 }
 
-}  // namespace
-
-Place locate(const char* path) {
-  Place place = {open_start(&path), "."};
+// The place that the rest of a path names below `start`.
+Place walk(unique_fd start, const char* path) {
+  Place place = {std::move(start), "."};
   bool started = false;
   for (path += strspn(path, "/"); *path != '\0' && place.folder != -1; path += strspn(path, "/")) {
     if (started) {
@@ -57,6 +58,18 @@ Place locate(const char* path) {
     started = true;
   }
   return place;
+}
+
+}  // namespace
+
+Place locate(const char* path) {
+  unique_fd start = open_start(&path);
+  return walk(std::move(start), path);
+}
+
+Place locate_from(int folder, const char* path) {
+  if (*path == '/') return locate(path);
+  return walk(unique_fd(openat(folder, ".", kStepFlags)), path);
 }
 
 unique_fd open_folder(const char* path) {

@@ -19,7 +19,9 @@ struct Place {
 
 // The place that `path` names, whether or not something is there. A "/" at the end changes nothing.
 // Follows no link below the directories that only the system can replace.
+// The second one takes a path that does not begin with "/" from the open directory `folder`.
 Place locate(const char* path);
+Place locate_from(int folder, const char* path);
 
 // Open a directory, never what a link names: by its path, as locate() finds it, or as an entry of
 // the directory `parent`. Close-on-exec; -1 with errno set on failure.

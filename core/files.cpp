@@ -18,6 +18,7 @@ namespace {
 constexpr uid_t kSystemUser = 1000;
 constexpr gid_t kSystemGroup = 1000;
 constexpr mode_t kProgramOutputMode = 0666;
+constexpr int kMaxLinks = 8;  // one leading to the next
 constexpr int kSafely = O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
 
 // A second name may be one that somebody has given to another's file.
@@ -40,9 +41,10 @@ unique_fd checked_output(unique_fd file) {
   return good ? std::move(file) : unique_fd();
 }
 
-bool is_copyable(const struct stat& status, Links links) {
-  if (S_ISFIFO(status.st_mode)) return true;
-  return is_regular(status) && (links != Links::kNone || has_one_name(status));
+// A directory can be opened; reading from it gives nothing.
+bool is_copyable(const struct stat& status) {
+  if (S_ISFIFO(status.st_mode) || S_ISDIR(status.st_mode)) return true;
+  return is_regular(status) && has_one_name(status);
 }
 
 // Reads the text of a link that the daemon's own user has made. The text is that of the very link
@@ -90,16 +92,21 @@ unique_fd open_program_output_at(int folder, const char* name) {
 }
 
 unique_fd open_source_at(int folder, const char* name, Links links) {
+  Place place;
   char target[PATH_MAX];
-  const bool follows = links == Links::kOwn && read_own_link(folder, name, target);
-  if (follows) name = target;
   // Looked at first: opening a device can do something by itself.
   struct stat status;
-  if (fstatat(folder, name, &status, follows ? 0 : AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
-  if (!is_copyable(status, links)) return unique_fd();
-  const int flags = O_RDONLY | (follows ? kSafely & ~O_NOFOLLOW : kSafely);
-  unique_fd file(openat(folder, name, flags));
-  if (file == -1 || fstat(file, &status) != 0 || !is_copyable(status, links)) return unique_fd();
+  if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
+  for (int i = 0; i < kMaxLinks && S_ISLNK(status.st_mode); ++i) {
+    if (links == Links::kNone || !read_own_link(folder, name, target)) break;
+    place = locate_from(folder, target);
+    folder = place.folder;
+    name = place.name;
+    if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
+  }
+  if (!is_copyable(status)) return unique_fd();
+  unique_fd file(openat(folder, name, O_RDONLY | kSafely));
+  if (file == -1 || fstat(file, &status) != 0 || !is_copyable(status)) return unique_fd();
   return file;
 }
 

@@ -20,11 +20,11 @@ android::base::unique_fd open_output_at(int folder, const char* name, int flags,
 android::base::unique_fd open_program_output(const char* path);
 android::base::unique_fd open_program_output_at(int folder, const char* name);
 
-// Which links a source may be reached through: none, be they symbolic or a second name of a file;
-// or symbolic ones that the daemon's own user has made.
+// Which symbolic links a source may be reached through: none, or those that the daemon's own user
+// has made, if they lead to files and not to directories on the way.
 enum class Links { kNone, kOwn };
 
-// Opens a file to be copied: a regular file, or a FIFO, which is read as far as it goes.
+// Opens a file to be copied: a regular file that bears no other name, or a FIFO.
 android::base::unique_fd open_source_at(int folder, const char* name, Links links);
 
 // Give an open file or directory, or a regular file by its name, to the system user while the log

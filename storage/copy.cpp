@@ -2,6 +2,7 @@
 
 #include <android-base/unique_fd.h>
 #include <fcntl.h>
+#include <stdint.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -22,9 +23,13 @@ constexpr mode_t kFileMode = 0644;
 constexpr mode_t kFolderMode = 0777;
 
 void copy_content(int from, int to) {
+  // What a FIFO holds and no more, however fast it is filled up again.
+  const int capacity = fcntl(from, F_GETPIPE_SZ);
+  int64_t left = capacity == -1 ? INT64_MAX : capacity;
   char chunk[kChunkSize];
-  ssize_t count;
-  while ((count = TEMP_FAILURE_RETRY(read(from, chunk, sizeof chunk))) > 0) {
+  for (ssize_t count; left > 0; left -= count) {
+    count = TEMP_FAILURE_RETRY(read(from, chunk, sizeof chunk));
+    if (count <= 0) return;
     // A full disk loses this chunk and perhaps not the next one.
     ssize_t ignored = write(to, chunk, count);
     (void)ignored;

@@ -130,8 +130,6 @@ int make_log_directory() {
   LOG_DIR.set(directory);
   log_info("corvexd: log dir is %s \n", directory.c_str());
   mkdirs(directory.c_str());
-  const unique_fd made = open_folder(directory.c_str());
-  if (made != -1) give_to_system(made);
 
   unique_fd version_file = write_version(directory);
   copy_marker(after_source, Path(directory).append("/fileAfter911"));

@@ -128,13 +128,22 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
     }
   });
   constexpr int kRounds = 200;
-  std::set<pid_t> started;
+  std::set<pid_t> started, started_beside;
+  static ChildSlot beside;
+  std::thread starter([&] {
+    for (int round = 0; round < kRounds; ++round) {
+      start_child(beside, end_at_once, nullptr);
+      started_beside.insert(beside.pid);
+    }
+  });
   for (int round = 0; round < kRounds; ++round) {
     ChildSlot& slot = slots[round % 4];
     start_child(slot, round % 2 == 0 ? work_and_end : end_at_once, nullptr);
     ASSERT_GT(slot.pid, 0);
     started.insert(slot.pid);
   }
+  starter.join();
+  started.merge(started_beside);
   done = true;
   storm.join();
   for (std::thread& thread : threads) thread.join();

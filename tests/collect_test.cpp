@@ -79,6 +79,15 @@ std::map<std::string, std::string> files_below(const std::string& directory) {
   return files;
 }
 
+// One event as the kernel tells it, its name cut to 16 bytes or filled up.
+std::string record(uint32_t mask, const std::string& name) {
+  struct inotify_event event = {};
+  event.mask = mask;
+  event.len = 16;
+  return std::string(reinterpret_cast<char*>(&event), sizeof event) +
+         (name + std::string(16, '\0')).substr(0, 16);
+}
+
 TEST_F(Collect, EveryArtefactComesToItsPlace) {
   Observer daemon(log);
   const std::string current = current_directory();
@@ -195,9 +204,11 @@ TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
   Observer daemon(log);
   const std::string current = current_directory();
   log.clear();
-  run("mkdir /data/coredump/elsewhere /data/misc/display/raw_dir /data/misc/display/raw_gone; "
-      "cd /data/misc/display/raw_dir; echo r > file; ln -s /probe/secret link; mkfifo fifo; "
-      "cd /data/coredump; ln -s /probe/secret core_link; ln /probe/secret core_hard; "
+  run("cd /data; ln -s /probe/new corvex/.nomedia; mkdir -p raw_dir coredump/elsewhere; "
+      "echo r > raw_dir/file; ln -s /probe/secret raw_dir/link; mv raw_dir misc/display; "
+      "mkdir misc/display/raw_dir_2; mv misc/display/raw_dir/* misc/display/raw_dir_2; "
+      "mkdir media/0/Pictures/Screenshots; cd coredump; ln -s /probe/secret core_link; ln "
+      "/probe/secret core_hard; "
       "mkfifo core_fifo; ln -s elsewhere core_folder; echo core > core_file");
   EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_file"] == "core\n"; }));
   for (const char* name : {"core_link", "core_hard", "core_folder"}) {
@@ -205,6 +216,12 @@ TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
   }
   EXPECT_EQ((Texts{"core_fifo", "core_file", "core_folder", "core_hard", "core_link"}),
             list(current + "/coredump"));
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/misc/display//raw_dir_2/link"));
+  EXPECT_EQ("r\n", files_below(current)["rawdata/raw_dir_2/file"]);
+  write_file("/data/media/0/Pictures/Screenshots/Screenshot_1", "shot");
+  EXPECT_TRUE(
+      eventually([&] { return files_below(current)["Screenshots/Screenshot_1"] == "shot"; }));
+  EXPECT_FALSE(exists("/probe/new"));
   // What a link of a watched directory's name leads to is not a watched directory.
   run("mv /data/tombstones /data/true && ln -s /probe /data/tombstones && echo > /data/true/x && "
       "mv /data/true/x /data/true/tombstone_x && echo t >> /data/true/tombstone_x");
@@ -227,9 +244,8 @@ TEST_F(Collect, WhatHasNoPlaceIsSaid) {
   EXPECT_EQ(-1, movefile("/data/coredump/", "core"));
   EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/uuu"));
   run("mkdir /data/corvex/a_current");
-  EXPECT_EQ(-1, movefile("/data/misc/display/", std::string(240, 'r').c_str()));
-  EXPECT_EQ(1u, log.count("corvexd: too long, skipped: /data/corvex/a_current/rawdata/rrr"));
-  EXPECT_EQ(Texts{}, list("/data/corvex/a_current"));
+  EXPECT_EQ(0, movefile("/data/misc/display/", std::string(240, 'r').c_str()));
+  EXPECT_EQ(1u, log.count("corvexd: open file failure. /data/misc/display//rrr"));
 }
 
 TEST_F(Collect, AHangingDumpHoldsUpNobody) {
@@ -246,6 +262,20 @@ TEST_F(Collect, AHangingDumpHoldsUpNobody) {
   EXPECT_EQ(1u, log.count("corvexd: anr_input is /system/bin/dumpsys input | xargs -0 echo > " +
                           current + "/anr/"));
   run("pkill -KILL sleep");
+}
+
+// Between its creation and its end it can be exchanged for a link.
+TEST_F(Collect, ATraceIsNoLink) {
+  checkLogPath();
+  write_file("/probe/secret", "secret");
+  createLogDirectory();
+  ObserverState state;
+  state.anr_directory.append(LOG_DIR.get().c_str()).append("/");
+  run("ln -s /probe/secret /data/anr/anr_1");
+  const std::string closed = record(IN_CLOSE_WRITE, "anr_1");
+  handle_events(state, closed.data(), closed.size());
+  EXPECT_TRUE(log.has("corvexd: open file failure. /data/anr//anr_1"));
+  EXPECT_EQ("", read_file(current_directory() + "/anr_1"));
 }
 
 // A directory's name can hold what a shell would run.
@@ -279,15 +309,6 @@ TEST_F(Collect, ATraceThatACaptureComesBetweenIsKept) {
     return files["anr/TIME/anr_1"] == "trace" && files["anr/TIME/dumpsys_input"] != "";
   }));
   EXPECT_FALSE(exists(first));
-}
-
-// One event as the kernel tells it, its name cut to 16 bytes or filled up.
-std::string record(uint32_t mask, const std::string& name) {
-  struct inotify_event event = {};
-  event.mask = mask;
-  event.len = 16;
-  return std::string(reinterpret_cast<char*>(&event), sizeof event) +
-         (name + std::string(16, '\0')).substr(0, 16);
 }
 
 // A trace makes its directory where the log directory last was, although that has been deleted. The

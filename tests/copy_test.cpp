@@ -5,6 +5,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <atomic>
+#include <thread>
+
 #include "core/state.h"
 #include "storage/earlier_logs.h"
 #include "tests/device_root.h"
@@ -50,6 +54,18 @@ TEST_F(Copy, NeitherAFifoNorAFullDiskHoldsItUp) {
   ASSERT_EQ(4, write(both_ends, "text", 4));
   EXPECT_EQ(1, copy_file("/data/from/fifo", "/data/log/fifo"));
   EXPECT_EQ("text", read_file("/data/log/fifo"));
+  // One that is filled up as fast as it is read has no end.
+  std::atomic<bool> done{false};
+  std::thread feeder([&] {
+    const std::string much(65536, 'f');
+    fcntl(both_ends, F_SETFL, O_NONBLOCK);
+    while (!done) write(both_ends, much.data(), much.size());
+  });
+  usleep(10'000);
+  EXPECT_EQ(1, copy_file("/data/from/fifo", "/data/log/endless"));
+  EXPECT_LE(read_file("/data/log/endless").size(), 65536u) << "what it held";
+  done = true;
+  feeder.join();
   close(both_ends);
   mkfifo("/data/log/sink", 0600);
   EXPECT_EQ(-1, copy_file("/data/log/fifo", "/data/log/sink"));
@@ -63,14 +79,19 @@ TEST_F(Copy, NeitherAFifoNorAFullDiskHoldsItUp) {
 TEST_F(Copy, LinksOfOthersLeadNowhere) {
   write_file("/probe/secret", "secret");
   run("cd /data/from && ln -s /probe/secret own && ln -s /probe/secret others && "
-      "ln -s /dev/zero device && echo plain > plain");
-  if (!owners_work()) unlink("/data/from/others");
+      "ln -s others through_others && ln -s ../../data/from/own through_own && "
+      "ln -s /dev/zero device && echo secret > /probe/linked && ln /probe/linked second_name && "
+      "echo plain > plain");
+  if (!owners_work()) run("rm /data/from/*others");
   lchown("/data/from/others", 10001, 10001);
   run("ln -s /probe/secret /data/log/link");
   copy_folder("/data/from/", "/sub/");
   EXPECT_EQ("secret", read_file("/data/log/sub/own"));
   EXPECT_EQ("plain\n", read_file("/data/log/sub/plain"));
-  EXPECT_EQ("", read_file("/data/log/sub/others"));
+  EXPECT_EQ("secret", read_file("/data/log/sub/through_own"));
+  for (const char* name : {"others", "through_others", "second_name"}) {
+    EXPECT_EQ("", read_file(std::string("/data/log/sub/") + name)) << name;
+  }
   EXPECT_EQ("", read_file("/data/log/sub/device")) << "a device has no end";
   EXPECT_TRUE(log.has("corvexd: open file failure. /data/from/device"));
   EXPECT_EQ(owners_work(), log.count("open file failure. /data/from/others") == 1);

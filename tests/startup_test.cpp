@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "early/boot_log.h"
 #include "early/initial_log.h"
 #include "tests/daemon.h"
 #include "tests/property_service.h"
@@ -155,6 +156,20 @@ TEST_F(Startup, EachBootSetsTheFilesOfTheLastOneAside) {
             list("/cache/boot_log"));
   EXPECT_TRUE(
       log.has("corvexd: Rename /cache/boot_log/kernel_boot.log failed! Error: Is a directory\n"));
+}
+
+TEST_F(Startup, NoLinkStandsForAnAreaOfTheCache) {
+  write_file("/probe/android_boot.log", "kept");
+  write_file("/probe/android_initial.log", "kept");
+  run("ln -s /probe /cache/boot_log; ln -s /probe /cache/log_before_initial");
+  renameOldBootLog("/cache/boot_log/android_boot.log");
+  EXPECT_TRUE(
+      log.has("corvexd: Rename /cache/boot_log/android_boot.log failed! Error: Not a directory\n"));
+  EXPECT_FALSE(deleteFile());
+  EXPECT_TRUE(log.has("corvexd: can't remove /cache/log_before_initial/android_initial.log \n"));
+  EXPECT_EQ(-1, getDirSize("/cache/log_before_initial/"));
+  EXPECT_EQ("kept", read_file("/probe/android_boot.log"));
+  EXPECT_EQ("kept", read_file("/probe/android_initial.log"));
 }
 
 TEST_F(Startup, TheInitialPhaseKeepsToItsSize) {
