@@ -84,8 +84,8 @@ TEST_F(ControlSocket, AnIllBehavedClientCostsItsOwnConnection) {
   int rude = connect_to_daemon();
   log.clear();
   send_all(rude, message("DELETELOG"));
-  ASSERT_TRUE(log.has("clean log CLEANSUCCESS \n"));
-  usleep(50'000);
+  struct pollfd answer = {rude, POLLIN, 0};
+  ASSERT_EQ(1, poll(&answer, 1, 10'000));
   close(rude);
   EXPECT_TRUE(log.has("corvexd: read error: Connection reset by peer\n"));
 
@@ -105,10 +105,10 @@ TEST_F(ControlSocket, ClientsSeeTheEndOfTheDaemonThoughItsReadersLiveOn) {
   run("mkdir -p /sys && rm -rf /data/corvex");
   send_commands({"CPUTHERMAL"});
   int second = connect_to_daemon();
-  send_all(second, message("CPUTHERMAL"));
-  ASSERT_TRUE(eventually([&] { return log.count("cpu&thermal log path") == 2; }));
+  send_all(second, message("CPUTHERMAL") + message("CHANGEPATH"));
+  ASSERT_TRUE(log.has("print buf--CHANGEPATH \n"));
   int waiting = connect_to_daemon();
-  run("rm -rf /data/corvex && touch /data/corvex");
+  run("mv /data/corvex /data/moved && touch /data/corvex");  // samplers still write below it
   send_all(second, message("LOGBEGIN"));
   EXPECT_EQ("", read_to_end(second));
   EXPECT_EQ("", read_to_end(waiting));
