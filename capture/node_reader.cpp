@@ -21,7 +21,8 @@ struct Counters {
 };
 
 [[noreturn]] void fail_to_open(const NodeReader& reader, const char* path) {
-  log_error(reader.texts.open_failed, path, strerror(errno));
+  log_error("corvexd: Open %s Error%s%s\n", path, reader.is_kernel_log ? "：" : " ",
+            strerror(errno));
   _exit(1);
 }
 
@@ -32,8 +33,8 @@ void begin_file(const NodeReader& reader, const char* path) {
 
 void open_both(const NodeReader& reader, const char* output) {
   if (access(reader.source, R_OK) != 0) {
-    log_error(reader.texts.source_unreadable, strerror(errno));
-    if (reader.needs_readable_source) _exit(1);
+    log_error("corvexd: %s log node can not be read: %s \n", reader.node_name, strerror(errno));
+    if (reader.is_kernel_log) _exit(1);
   }
   int access_mode = reader.erases_source ? O_RDWR : O_RDONLY;
   *reader.from_fd = open(reader.source, access_mode | O_CLOEXEC);
@@ -42,16 +43,30 @@ void open_both(const NodeReader& reader, const char* output) {
   give_to_system(*reader.to_fd);
 }
 
+void log_lost_output(const NodeReader& reader, const char* path, int error) {
+  if (reader.is_kernel_log) {
+    log_error("corvexd: %s log node can not access: %s, errno: %d, %s\n", reader.node_name, path,
+              error, strerror(error));
+  } else {
+    log_error("corvexd: %s log node can not access: %s \n", reader.node_name, path);
+  }
+}
+
 // A file that has been removed under the reader takes the bytes of its last write along.
 void replace_lost_output(const NodeReader& reader, const char* path) {
-  if (access(path, reader.appends_when_reopened ? F_OK : R_OK) == 0) return;
-  log_error(reader.texts.output_gone, path, errno, strerror(errno));
+  if (access(path, reader.is_kernel_log ? F_OK : R_OK) == 0) return;
+  log_lost_output(reader, path, errno);
   close(*reader.to_fd);
   begin_file(reader, path);
-  if (reader.appends_when_reopened && lseek(*reader.to_fd, 0, SEEK_END) == -1) {
+  if (reader.is_kernel_log && lseek(*reader.to_fd, 0, SEEK_END) == -1) {
     log_error("corvexd: lseek failed! %s\n", strerror(errno));
     _exit(1);
   }
+}
+
+void log_failed_write(const NodeReader& reader, int error) {
+  log_error("corvexd: bytes_write is -1, write %s log fail! Error: %s \n", reader.name,
+            strerror(error));
 }
 
 void rotate_when_due(const NodeReader& reader, const char* path, Counters* counters, int written) {
@@ -61,13 +76,14 @@ void rotate_when_due(const NodeReader& reader, const char* path, Counters* count
   if (size <= 0 || counters->total / size <= counters->count) return;
   ++counters->count;
   close(*reader.to_fd);
-  shift_series(path, counters->count, reader.owns_rotated_files);
+  shift_series(path, counters->count, /*owned=*/reader.is_kernel_log);
   *reader.to_fd = open_output(path, O_WRONLY, kOutputMode).release();
   if (*reader.to_fd == -1) {
-    log_error(reader.texts.reopen_failed, path, strerror(errno));
+    log_error("corvexd: Open %s Error %s\n", path, strerror(errno));
     _exit(1);
   }
-  log_debug(reader.texts.rotated, static_cast<long long>(counters->total), counters->count);
+  log_debug("total %s bytes write %lld,offset %d", reader.name,
+            static_cast<long long>(counters->total), counters->count);
 }
 
 void copy_block(const NodeReader& reader, const char* path, const char* block, size_t size,
@@ -77,7 +93,7 @@ void copy_block(const NodeReader& reader, const char* path, const char* block, s
     int error = errno;
     replace_lost_output(reader, path);
     if (written == -1) {
-      log_error(reader.texts.write_failed, strerror(error));
+      log_failed_write(reader, error);
       return;
     }
     if (written == 0) continue;
@@ -95,16 +111,17 @@ void copy_source(const NodeReader& reader, const char* path) {
   for (int64_t reads = 0; reader.max_reads == 0 || reads < reader.max_reads; ++reads) {
     ssize_t size = read(*reader.from_fd, block, sizeof block);
     if (reader.erases_source && block[0] == '\0') {
-      log_error("%s", reader.texts.empty_block);
+      log_error("reserve1 is null\n");
       return;
     }
     if (size == 0) {
-      if (reader.texts.end_of_source != nullptr) log_error("%s", reader.texts.end_of_source);
+      if (reader.logs_end) log_error("corvexd: eof, %s log process continue \n", reader.name);
       if (reader.at_end == AtEnd::kStop) return;
       continue;
     }
     if (size == -1) {
-      log_error(reader.texts.read_failed, strerror(errno));
+      log_error("corvexd: bytes_read is -1, read %s log fail! Error: %s \n", reader.name,
+                strerror(errno));
       return;
     }
     copy_block(reader, path, block, size, &counters);
@@ -116,7 +133,7 @@ void erase_source(const NodeReader& reader) {
   lseek(*reader.from_fd, 0, SEEK_SET);
   for (int i = 0; i < reader.max_reads; ++i) {
     if (write(*reader.from_fd, zeros, sizeof zeros) == -1) {
-      log_error(reader.texts.write_failed, strerror(errno));
+      log_failed_write(reader, errno);
       return;
     }
   }

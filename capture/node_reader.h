@@ -10,34 +10,20 @@ namespace corvexd {
 
 enum class AtEnd { kReadAgain, kStop };
 
-// Formats take their arguments in the order given; a text that has no use for the last ones leaves
-// them out. Null: nothing is logged.
-struct NodeTexts {
-  const char* source_unreadable;  // error text
-  const char* open_failed;        // path, error text
-  const char* reopen_failed;      // after a rotation: path, error text
-  const char* read_failed;        // error text
-  const char* end_of_source;
-  const char* empty_block;
-  const char* output_gone;   // path, error number, error text
-  const char* write_failed;  // error text
-  const char* rotated;       // bytes written, number of rotations
-};
-
 struct NodeReader {
+  const char* name;       // what the log calls it,
+  const char* node_name;  // and what it calls its node there
   const char* source;
   const PublishedPath* output;
   int32_t* from_fd;
   int32_t* to_fd;
-  bool needs_readable_source;  // ends when access(2) denies it; else the open decides
-  AtEnd at_end;                // of the source
+  AtEnd at_end;  // of the source,
+  bool logs_end;
   int max_reads;               // 0: without limit
   bool erases_source;          // stops at a block that starts with NUL, and zeroes the source's
                                // first max_reads blocks when it has read
   int64_t (*rotation_size)();  // bytes; null, zero or less: no rotation
-  bool owns_rotated_files;     // gives them to the system user
-  bool appends_when_reopened;
-  NodeTexts texts;
+  bool is_kernel_log;          // which is an exception wherever this is asked
 };
 
 // Runs one reader in the calling child, which has no other thread and allocates nothing. Returns

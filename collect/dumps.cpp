@@ -48,10 +48,10 @@ void run_clear(const void*) {
   exec_program("/system/bin/logcat", arguments);
 }
 
-void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* fork_error_format) {
+void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* name) {
   start_child(slot, body, nullptr);
   if (slot.pid < 0) {
-    log_error(fork_error_format, strerror(errno));
+    log_error("corvexd: %s process fork error: %s", name, strerror(errno));
     return;
   }
   if (WIFSIGNALED(wait_for_child(slot))) log_error("corvexd: Child terminated abnormally\n");
@@ -59,11 +59,9 @@ void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* fork_e
 
 }  // namespace
 
-void getBugreport() {
-  run_and_wait(bugreport_slot, run_bugreport, "corvexd: Bugreport process fork error: %s");
-}
+void getBugreport() { run_and_wait(bugreport_slot, run_bugreport, "Bugreport"); }
 
-void cacheClear() { run_and_wait(clear_slot, run_clear, "corvexd: Clear process fork error: %s"); }
+void cacheClear() { run_and_wait(clear_slot, run_clear, "Clear"); }
 
 const char* otherLogsCommand(const char* command, const char* kind, char* file_name) {
   static PathBuffer<200> line;

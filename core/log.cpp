@@ -14,7 +14,8 @@ constexpr char kTag[] = "corvexd";
 // a command with its path is longer than that.
 constexpr size_t kMaxLine = 4068 - 1 - sizeof kTag;
 
-void write_line(int priority, const char* format, va_list arguments) {
+__attribute__((format(printf, 2, 0))) void write_line(int priority, const char* format,
+                                                      va_list arguments) {
   int saved_errno = errno;
   char line[kMaxLine];
   vsnprintf(line, sizeof line, format, arguments);
