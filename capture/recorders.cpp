@@ -1,12 +1,10 @@
 #include "capture/recorders.h"
 
-#include <cutils/properties.h>
-#include <string.h>
-
 #include "capture/capture_state.h"
 #include "capture/logcat_vector.h"
 #include "capture/node_reader.h"
 #include "core/log.h"
+#include "core/properties.h"
 #include "core/settings.h"
 #include "core/state.h"
 #include "storage/capture_paths.h"
@@ -70,10 +68,6 @@ const Recorder kRecorders[kRecorderCount] = {
      {&pre_bootloader_from_fd, &pre_bootloader_to_fd}},
 };
 
-bool switched_on(const char* property) {
-  char value[PROPERTY_VALUE_MAX];
-  property_get(property, value, "no");
-  return strcmp(value, "yes") == 0;
-}
+bool switched_on(const char* property) { return property_is(property, "yes", "no"); }
 
 }  // namespace corvexd

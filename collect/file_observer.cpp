@@ -17,6 +17,7 @@
 #include "core/local_time.h"
 #include "core/log.h"
 #include "core/pause.h"
+#include "core/properties.h"
 #include "core/state.h"
 #include "storage/copy.h"
 #include "storage/current_directory.h"
@@ -174,12 +175,6 @@ void handle_event(ObserverState& state, uint32_t mask, const char* name) {
   if ((mask & IN_MOVED_TO) != 0) movefile("/data/system/dropbox", name);
 }
 
-bool persistent_capture_is_on() {
-  char panic[PROPERTY_VALUE_MAX];
-  property_get("persist.sys.assert.panic", panic, "false");
-  return strcmp(panic, "true") == 0;
-}
-
 }  // namespace
 
 bool EventReader::read(Event* event) {
@@ -222,7 +217,8 @@ void* file_observer(void*) {
       log_error("corvexd: Inotify read failed: %s", strerror(errno));
       return nullptr;
     }
-    if (size > 0 && persistent_capture_is_on()) handle_events(state, records, size);
+    if (size > 0 && property_is("persist.sys.assert.panic", "true"))
+      handle_events(state, records, size);
   }
 }
 

@@ -2,9 +2,9 @@
 
 #include <cutils/properties.h>
 #include <stdlib.h>
-#include <string.h>
 
 #include "core/pause.h"
+#include "core/properties.h"
 
 namespace corvexd {
 namespace {
@@ -118,9 +118,7 @@ void set_nfc_android_log(int enable) { set_level(kNfcTags, enable); }
 void set_gps_android_log(int enable) { set_level(kLocationTags, enable); }
 
 void set_connectivit_android_log() {
-  char panic[PROPERTY_VALUE_MAX];
-  property_get("persist.sys.assert.panic", panic, "false");
-  if (strcmp(panic, "true") == 0) property_set("persist.oem.nfc.debug", "1");
+  if (property_is("persist.sys.assert.panic", "true")) property_set("persist.oem.nfc.debug", "1");
   set_nfc_android_log(read_switch("persist.oem.nfc.debug"));
   set_gps_android_log(read_switch("persist.oem.gps.debug"));
   read_switch("persist.oem.wifi.debug");  // governs no tag yet

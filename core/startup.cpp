@@ -8,6 +8,7 @@
 #include "capture/capture.h"
 #include "core/log.h"
 #include "core/pause.h"
+#include "core/properties.h"
 #include "core/state.h"
 #include "fs_mgr/fs_mgr_fstab.h"
 
@@ -25,22 +26,15 @@ bool layout_is_ready() {
   return fs_read_atomic_int(kLayoutVersion, &version) == 0 && version >= kReadyLayout;
 }
 
-bool reads(const char* property, const char* wanted, const char* default_value = "") {
-  char value[PROPERTY_VALUE_MAX];
-  property_get(property, value, default_value);
-  return strcmp(value, wanted) == 0;
-}
-
 bool framework_has_restarted() {
-  return reads("vold.decrypt", "trigger_restart_framework") && reads("vold.internalSD.mount", "1");
+  return property_is("vold.decrypt", "trigger_restart_framework") &&
+         property_is("vold.internalSD.mount", "1");
 }
 
 bool internal_storage_is_mounted() {
   log_error("corvexd: Waiting for internal sd be mounted... \n");
-  char mount[PROPERTY_VALUE_MAX];
-  property_get("vold.internalSD.mount", mount, "");
-  bool on_tempfs = reads("ro.mount.tempfs", "true");
-  return strcmp(mount, "1") == 0 || (on_tempfs && strcmp(mount, "A") == 0);
+  if (property_is("vold.internalSD.mount", "1")) return true;
+  return property_is("vold.internalSD.mount", "A") && property_is("ro.mount.tempfs", "true");
 }
 
 }  // namespace
@@ -79,7 +73,7 @@ void start_persistent_capture() {
 }
 
 void start_diagnostic_service() {
-  if (!reads("persist.sys.qxdm", "yes", "no")) return;
+  if (!property_is("persist.sys.qxdm", "yes", "no")) return;
   log_debug("start diag_mdlog_start");
   property_set("ctl.start", "diag_mdlog_start");
 }

@@ -1,6 +1,5 @@
 #include "early/boot_log.h"
 
-#include <cutils/properties.h>
 #include <errno.h>
 #include <stdio.h>
 #include <string.h>
@@ -14,6 +13,7 @@
 #include "core/log.h"
 #include "core/path_buffer.h"
 #include "core/pause.h"
+#include "core/properties.h"
 #include "core/state.h"
 #include "early/area.h"
 #include "storage/copy.h"
@@ -98,15 +98,14 @@ void executeOnBootLogcat() {
 }
 
 void* stopLogAfterBoot(void*) {
-  char panic[PROPERTY_VALUE_MAX];
-  property_get("persist.sys.assert.panic", panic, "false");
+  const bool persistent_capture = property_is("persist.sys.assert.panic", "true");
   const Path area = cache_file(kArea);
   pause_seconds(kRecordedTime);
   for (ChildSlot* slot : {&android_boot_pid, &event_boot_pid, &kernel_boot_pid, &radio_boot_pid}) {
     terminate_child(*slot);
   }
   log_error("corvexd: executeOnBootLogcat stop \n");
-  if (strcmp(panic, "true") == 0) copy_folder(area.c_str(), "/boot_log/");
+  if (persistent_capture) copy_folder(area.c_str(), "/boot_log/");
   return nullptr;
 }
 
