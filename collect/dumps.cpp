@@ -28,10 +28,8 @@ ChildSlot clear_slot;
 
 // The line says where the report goes. What opens that file is not the shell, which would follow
 // whatever somebody has put there, but this child, before it hands its output to the tool.
-void run_bugreport(const void*) {
-  char file_name[100];
-  const char* line = otherLogsCommand("bugreport", "BUGREPORT", file_name);
-  if (line == nullptr) return;
+void run_bugreport(const void* command_line) {
+  const char* line = static_cast<const char*>(command_line);
   const char* path = strstr(line, kRedirection) + strlen(kRedirection);
   const unique_fd output = open_program_output(path);
   if (output == -1) {
@@ -48,8 +46,9 @@ void run_clear(const void*) {
   exec_program("/system/bin/logcat", arguments);
 }
 
-void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* name) {
-  start_child(slot, body, nullptr);
+void run_and_wait(ChildSlot& slot, void (*body)(const void*), const void* argument,
+                  const char* name) {
+  start_child(slot, body, argument);
   if (slot.pid < 0) {
     log_error("corvexd: %s process fork error: %s", name, strerror(errno));
     return;
@@ -59,9 +58,13 @@ void run_and_wait(ChildSlot& slot, void (*body)(const void*), const char* name) 
 
 }  // namespace
 
-void getBugreport() { run_and_wait(bugreport_slot, run_bugreport, "Bugreport"); }
+void getBugreport() {
+  char file_name[100];
+  const char* line = otherLogsCommand("bugreport", "BUGREPORT", file_name);
+  if (line != nullptr) run_and_wait(bugreport_slot, run_bugreport, line, "Bugreport");
+}
 
-void cacheClear() { run_and_wait(clear_slot, run_clear, "Clear"); }
+void cacheClear() { run_and_wait(clear_slot, run_clear, nullptr, "Clear"); }
 
 const char* otherLogsCommand(const char* command, const char* kind, char* file_name) {
   static PathBuffer<200> line;
