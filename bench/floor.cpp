@@ -17,14 +17,87 @@
 namespace {
 
 constexpr size_t kBlock = 1024;
+constexpr int kStep = O_PATH | O_DIRECTORY | O_CLOEXEC;
+constexpr int kSafely = O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
 
 bool is_dot(const char* name) { return strcmp(name, ".") == 0 || strcmp(name, "..") == 0; }
 
+// Opens the directory in which the last component of a path lies. Others can write there, and an
+// open of the whole path would go wherever they lead it; so each step is a directory and no link.
+int reach(const char* path, const char** name) {
+  int folder = open(*path == '/' ? "/" : ".", kStep);
+  path += strspn(path, "/");
+  while (const char* slash = strchr(path, '/')) {
+    char step[NAME_MAX + 1];
+    snprintf(step, sizeof step, "%.*s", static_cast<int>(slash - path), path);
+    int next = openat(folder, step, kStep | O_NOFOLLOW);
+    close(folder);
+    folder = next;
+    path = slash + 1;
+  }
+  *name = path;
+  return folder;
+}
+
+// A file that is there already may be another's that somebody has linked to here: it is looked at.
+// A new one is to have exactly the mode, and what the umask takes from it only fchmod gives back.
 int create_at(int folder, const char* name, int flags, mode_t mode) {
-  flags |= O_CREAT | O_CLOEXEC;
+  flags |= O_CREAT | kSafely;
   int fd = openat(folder, name, flags | O_EXCL, mode);
-  if (fd == -1) return openat(folder, name, flags, mode);
-  fchmod(fd, mode);
+  if (fd != -1) {
+    fchmod(fd, mode);
+    return fd;
+  }
+  struct stat status;
+  fd = openat(folder, name, flags, mode);
+  return fstat(fd, &status) == 0 && S_ISREG(status.st_mode) && status.st_nlink == 1 ? fd : -1;
+}
+
+int create(const char* path, int flags, mode_t mode) {
+  const char* name;
+  int folder = reach(path, &name);
+  int fd = create_at(folder, name, flags, mode);
+  close(folder);
+  return fd;
+}
+
+bool is_source(const struct stat& status) {
+  return S_ISFIFO(status.st_mode) || (S_ISREG(status.st_mode) && status.st_nlink == 1);
+}
+
+// Looked at before it is opened, as opening a device can do something by itself, and again when it
+// is open, as something else may bear the name by then.
+int open_source(int folder, const char* name) {
+  struct stat status;
+  if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0 || !is_source(status)) return -1;
+  int fd = openat(folder, name, O_RDONLY | kSafely);
+  return fstat(fd, &status) == 0 && is_source(status) ? fd : -1;
+}
+
+DIR* open_below(int folder, const char* name) {
+  return fdopendir(openat(folder, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+}
+
+DIR* list(const char* path) {
+  const char* name;
+  int folder = reach(path, &name);
+  DIR* directory = open_below(folder, name);
+  close(folder);
+  return directory;
+}
+
+// Renames each file of a series to the next number and begins it anew.
+int rotate(const char* path, int count) {
+  const char* name;
+  int folder = reach(path, &name);
+  for (int i = count; i >= 1; --i) {
+    char old_name[PATH_MAX], new_name[PATH_MAX];
+    snprintf(old_name, sizeof old_name, i > 1 ? "%s.%d" : "%s", name, i - 1);
+    snprintf(new_name, sizeof new_name, "%s.%d", name, i);
+    renameat(folder, old_name, folder, new_name);
+  }
+  int fd = create_at(folder, name, O_WRONLY, 0600);
+  close(folder);
   return fd;
 }
 
@@ -33,7 +106,7 @@ int run_reader(char** arguments) {
   const long limit = strtol(arguments[2], nullptr, 10);
   if (access(arguments[0], R_OK) != 0) return 1;
   int from = open(arguments[0], O_RDONLY | O_CLOEXEC);
-  int to = create_at(AT_FDCWD, path, O_WRONLY, 0600);
+  int to = create(path, O_WRONLY, 0600);
   char block[kBlock];
   long total = 0;
   int count = 0;
@@ -43,46 +116,46 @@ int run_reader(char** arguments) {
     if (total / limit <= count) continue;
     ++count;
     close(to);
-    for (int i = count; i >= 1; --i) {
-      char old_name[PATH_MAX], new_name[PATH_MAX];
-      snprintf(old_name, sizeof old_name, i > 1 ? "%s.%d" : "%s", path, i - 1);
-      snprintf(new_name, sizeof new_name, "%s.%d", path, i);
-      rename(old_name, new_name);
-    }
-    to = create_at(AT_FDCWD, path, O_WRONLY, 0600);
+    to = rotate(path, count);
   }
   return 0;
 }
 
-int copy_at(const char* source, int folder, const char* name) {
-  int from = open(source, O_RDONLY | O_NONBLOCK | O_CLOEXEC);
-  int to = create_at(folder, name, O_WRONLY | O_APPEND | O_NONBLOCK, 0644);
+int copy(int from_folder, const char* from_name, int to_folder, const char* to_name) {
+  int from = open_source(from_folder, from_name);
+  int to = create_at(to_folder, to_name, O_WRONLY | O_APPEND, 0644);
+  // Of a FIFO, which need have no end, only as much is copied as it can hold. Whether this is one
+  // and how much that is, the kernel tells in one call.
+  const int capacity = fcntl(from, F_GETPIPE_SZ);
+  long left = capacity == -1 ? LONG_MAX : capacity;
   char block[kBlock];
-  for (ssize_t size; (size = read(from, block, sizeof block)) > 0;) {
+  for (ssize_t size; left > 0 && (size = read(from, block, sizeof block)) > 0; left -= size) {
     if (write(to, block, size) != size) return 1;
   }
   close(from);
   return close(to);
 }
 
-int run_copy_file(char** arguments) { return copy_at(arguments[0], AT_FDCWD, arguments[1]); }
-
-int run_copy_folder(char** arguments) {
-  DIR* source = opendir(arguments[0]);
-  int folder = open(arguments[1], O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  while (struct dirent* entry = readdir(source)) {
-    char path[PATH_MAX];
-    struct stat status;
-    if (is_dot(entry->d_name)) continue;
-    snprintf(path, sizeof path, "%s/%s", arguments[0], entry->d_name);
-    if (stat(path, &status) != 0 || S_ISDIR(status.st_mode)) continue;
-    if (copy_at(path, folder, entry->d_name) != 0) return 1;
-  }
-  return 0;
+int run_copy_file(char** arguments) {
+  const char *from_name, *to_name;
+  int from = reach(arguments[0], &from_name);
+  int to = reach(arguments[1], &to_name);
+  return copy(from, from_name, to, to_name);
 }
 
-DIR* open_below(int folder, const char* name) {
-  return fdopendir(openat(folder, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+int run_copy_folder(char** arguments) {
+  DIR* source = list(arguments[0]);
+  const int from = dirfd(source);
+  int to = dirfd(list(arguments[1]));
+  while (struct dirent* entry = readdir(source)) {
+    struct stat status;
+    if (is_dot(entry->d_name) || entry->d_type == DT_DIR) continue;
+    // A file is known by its type in the listing; of a link that does not tell where it leads.
+    bool is_file = entry->d_type == DT_REG ||
+                   (fstatat(from, entry->d_name, &status, 0) == 0 && !S_ISDIR(status.st_mode));
+    if (is_file && copy(from, entry->d_name, to, entry->d_name) != 0) return 1;
+  }
+  return 0;
 }
 
 int empty(DIR* directory) {
@@ -102,7 +175,7 @@ int empty(DIR* directory) {
   return closedir(directory);
 }
 
-int run_delete(char** arguments) { return empty(opendir(arguments[0])); }
+int run_delete(char** arguments) { return empty(list(arguments[0])); }
 
 long size_of(DIR* directory) {
   long total = 0;
@@ -122,47 +195,46 @@ long size_of(DIR* directory) {
 int run_dirsize(char** arguments) {
   const int times = arguments[1] == nullptr ? 1 : atoi(arguments[1]);
   long size = 0;
-  for (int i = 0; i < times; ++i) size = size_of(opendir(arguments[0]));
+  for (int i = 0; i < times; ++i) size = size_of(list(arguments[0]));
   printf("%ld\n", size);
   return 0;
 }
 
-// Reading alone: what a line means is not asked.
+// Reading alone, twice as the table is made when the lines have been counted: what a line means is
+// not asked.
 int run_fstab(char** arguments) {
   int lines = 0;
   for (int i = atoi(arguments[1]); i > 0; --i) {
     FILE* file = fopen(arguments[0], "re");
     char line[kBlock];
-    lines = 0;
-    while (fgets(line, sizeof line, file) != nullptr) ++lines;
+    for (int pass = 0; pass < 2; ++pass) {
+      lines = 0;
+      fseeko(file, 0, SEEK_SET);
+      while (fgets(line, sizeof line, file) != nullptr) ++lines;
+    }
     fclose(file);
   }
   printf("%d\n", lines);
   return 0;
 }
 
-// As the mover does it: looks for the current directory, makes sure of each component of its path,
-// looks at the artefact, and copies it.
+// Looks for the current directory and copies the artefact into it, from the directory in which it
+// was seen.
 int collect(const char* directory, const char* name, const char* root_path) {
-  char current[PATH_MAX] = {}, source[PATH_MAX];
-  DIR* root = opendir(root_path);
+  char current[NAME_MAX + 1] = {};
+  DIR* root = list(root_path);
   while (struct dirent* entry = readdir(root)) {
-    if (strstr(entry->d_name, "_current") == nullptr) continue;
-    snprintf(current, sizeof current, "%s/%s/", root_path, entry->d_name);
+    if (strstr(entry->d_name, "_current") != nullptr) strcpy(current, entry->d_name);
   }
+  int to = openat(dirfd(root), current, kStep | O_NOFOLLOW);
   closedir(root);
-  for (char* slash = current; (slash = strchr(slash + 1, '/')) != nullptr; *slash = '/') {
-    *slash = '\0';
-    if (access(current, F_OK) != 0) return 1;
-  }
-  if (access(current, F_OK) != 0) return 1;
-  int folder = open(current, O_PATH | O_DIRECTORY | O_CLOEXEC);
-  DIR* from = opendir(directory);
-  struct stat status;
-  snprintf(source, sizeof source, "%s/%s", directory, name);
-  int result = lstat(source, &status) == 0 ? copy_at(source, folder, name) : 1;
-  closedir(from);
-  close(folder);
+  const char* directory_name;
+  int above = reach(directory, &directory_name);
+  int from = openat(above, directory_name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+  close(above);
+  int result = copy(from, name, to, name);
+  close(from);
+  close(to);
   return result;
 }
 
