@@ -35,6 +35,8 @@ class Traced:
     def __init__(self, *command: str) -> None:
         preload = f"LD_PRELOAD={PROGRAMS / 'libbench_allocations.so'}"
         tracer = ["strace", "-f", "-c", "-U", "name,calls", "-o", "calls", "-E", preload]
+        # Where the zone is not told, the C library looks for it anew whenever the time is asked.
+        tracer += ["-E", "TZ=UTC0"]
         self.process = subprocess.Popen([*tracer, *command], stdout=subprocess.PIPE)
 
     def wait(self, status: int = 0) -> None:

@@ -65,11 +65,9 @@ bool is_source(const struct stat& status) {
   return S_ISFIFO(status.st_mode) || (S_ISREG(status.st_mode) && status.st_nlink == 1);
 }
 
-// Looked at before it is opened, as opening a device can do something by itself, and again when it
-// is open, as something else may bear the name by then.
+// Looked at once it is open: before that, something else could still take its name.
 int open_source(int folder, const char* name) {
   struct stat status;
-  if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0 || !is_source(status)) return -1;
   int fd = openat(folder, name, O_RDONLY | kSafely);
   return fstat(fd, &status) == 0 && is_source(status) ? fd : -1;
 }
@@ -149,10 +147,9 @@ int run_copy_folder(char** arguments) {
   int to = dirfd(list(arguments[1]));
   while (struct dirent* entry = readdir(source)) {
     struct stat status;
-    if (is_dot(entry->d_name) || entry->d_type == DT_DIR) continue;
-    // A file is known by its type in the listing; of a link that does not tell where it leads.
-    bool is_file = entry->d_type == DT_REG ||
-                   (fstatat(from, entry->d_name, &status, 0) == 0 && !S_ISDIR(status.st_mode));
+    if (is_dot(entry->d_name)) continue;
+    // What has vanished since the listing leaves no empty copy; a link may lead to a directory.
+    bool is_file = fstatat(from, entry->d_name, &status, 0) == 0 && !S_ISDIR(status.st_mode);
     if (is_file && copy(from, entry->d_name, to, entry->d_name) != 0) return 1;
   }
   return 0;
@@ -226,13 +223,18 @@ int collect(const char* directory, const char* name, const char* root_path) {
   while (struct dirent* entry = readdir(root)) {
     if (strstr(entry->d_name, "_current") != nullptr) strcpy(current, entry->d_name);
   }
-  int to = openat(dirfd(root), current, kStep | O_NOFOLLOW);
   closedir(root);
-  const char* directory_name;
+  char target[PATH_MAX];
+  snprintf(target, sizeof target, "%s/%s/%s", root_path, current, name);
+  const char *target_name, *directory_name;
+  int to = reach(target, &target_name);
   int above = reach(directory, &directory_name);
   int from = openat(above, directory_name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
   close(above);
-  int result = copy(from, name, to, name);
+  // A directory's files would be copied instead.
+  struct stat status;
+  if (fstatat(from, name, &status, AT_SYMLINK_NOFOLLOW) != 0 || S_ISDIR(status.st_mode)) return 1;
+  int result = copy(from, name, to, target_name);
   close(from);
   close(to);
   return result;

@@ -66,7 +66,7 @@ void BM_Rotate(benchmark::State& state) {
     state.PauseTiming();
     touch(path);
     state.ResumeTiming();
-    shift_series(path.c_str(), count, false);
+    shift_series(locate(path.c_str()), count, false);
   }
   state.SetComplexityN(count);
 }

@@ -1,13 +1,17 @@
 #include "capture/node_reader.h"
 
+#include <android-base/unique_fd.h>
 #include <errno.h>
 #include <fcntl.h>
 #include <string.h>
 #include <unistd.h>
 
 #include "capture/rotation.h"
+#include "core/directory.h"
 #include "core/files.h"
 #include "core/log.h"
+
+using android::base::unique_fd;
 
 namespace corvexd {
 namespace {
@@ -76,8 +80,11 @@ void rotate_when_due(const NodeReader& reader, const char* path, Counters* count
   if (size <= 0 || counters->total / size <= counters->count) return;
   ++counters->count;
   close(*reader.to_fd);
-  shift_series(path, counters->count, /*owned=*/reader.is_kernel_log);
-  *reader.to_fd = open_output(path, O_WRONLY, kOutputMode).release();
+  const Place place = locate(path);
+  shift_series(place, counters->count, /*owned=*/reader.is_kernel_log);
+  unique_fd output;
+  if (place.folder != -1) output = open_output_at(place.folder, place.name, O_WRONLY, kOutputMode);
+  *reader.to_fd = output.release();
   if (*reader.to_fd == -1) {
     log_error("corvexd: Open %s Error %s\n", path, strerror(errno));
     _exit(1);

@@ -3,7 +3,6 @@
 #include <errno.h>
 #include <stdio.h>
 
-#include "core/directory.h"
 #include "core/files.h"
 #include "core/log.h"
 #include "core/path_buffer.h"
@@ -27,8 +26,7 @@ void complain() {
 
 }  // namespace
 
-void shift_series(const char* path, int count, bool owned) {
-  const Place place = locate(path);
+void shift_series(const Place& place, int count, bool owned) {
   if (place.folder == -1) return complain();
   SeriesName new_name = series_name(place.name, count);
   for (int i = count; i >= 1; --i) {

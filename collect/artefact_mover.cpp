@@ -109,10 +109,13 @@ void copy_artefact(int source, const char* dir, const char* name, int folder,
 // Makes the destination below the current log directory and finds the place of the copy in it,
 // without an earlier copy where the row replaces one.
 Place provide_place(const Destination& row, const LongPath& destination, const char* name) {
-  mkdirs(destination.c_str());
   LongPath copy(destination);
   copy.append(name);
   Place place = locate(copy.c_str());
+  if (place.folder == -1) {
+    mkdirs(destination.c_str());
+    place = locate(copy.c_str());
+  }
   if (row.replaces && faccessat(place.folder, place.name, R_OK, 0) == 0) {
     unlinkat(place.folder, place.name, 0);
   }

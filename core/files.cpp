@@ -92,20 +92,17 @@ unique_fd open_program_output_at(int folder, const char* name) {
 }
 
 unique_fd open_source_at(int folder, const char* name, Links links) {
+  unique_fd file(openat(folder, name, O_RDONLY | kSafely));
   Place place;
   char target[PATH_MAX];
-  // Looked at first: opening a device can do something by itself.
-  struct stat status;
-  if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
-  for (int i = 0; i < kMaxLinks && S_ISLNK(status.st_mode); ++i) {
-    if (links == Links::kNone || !read_own_link(folder, name, target)) break;
+  for (int i = 0; i < kMaxLinks && file == -1 && errno == ELOOP && links == Links::kOwn; ++i) {
+    if (!read_own_link(folder, name, target)) break;
     place = locate_from(folder, target);
     folder = place.folder;
     name = place.name;
-    if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return unique_fd();
+    file.reset(openat(folder, name, O_RDONLY | kSafely));
   }
-  if (!is_copyable(status)) return unique_fd();
-  unique_fd file(openat(folder, name, O_RDONLY | kSafely));
+  struct stat status;
   if (file == -1 || fstat(file, &status) != 0 || !is_copyable(status)) return unique_fd();
   return file;
 }
