@@ -381,6 +381,30 @@ TEST_F(Collect, TagsFollowTheirSwitchesAndCommands) {
   EXPECT_EQ("1", property("persist.oem.nfc.debug"));
 }
 
+class Minutes {
+ public:
+  static void pass() {
+    write_file(kEnd, "");
+    EXPECT_TRUE(eventually([] { return !exists(kEnd); }));
+  }
+  // That of the boot recorders; who else pauses as long may take the sign first.
+  static void end_the_first(LogCatcher& log) {
+    EXPECT_TRUE(eventually([&] {
+      pass();
+      return log.count("corvexd: executeOnBootLogcat stop \n") == 1;
+    }));
+  }
+  static void expect_that_nobody_waits_for_one() {
+    write_file(kEnd, "");
+    usleep(100'000);
+    EXPECT_TRUE(exists(kEnd));
+    unlink(kEnd);
+  }
+
+ private:
+  static constexpr char kEnd[] = "/probe/end_pause_60";
+};
+
 TEST_F(Collect, AStaleLogHasInitRestartTheLogDaemonAndThisOne) {
   Daemon daemon(log);
   write_file(current_directory() + "/android.log", "old");
@@ -392,22 +416,33 @@ TEST_F(Collect, AStaleLogHasInitRestartTheLogDaemonAndThisOne) {
     }
     return names;
   };
-  auto pass_a_minute = [] {  // for the one or the other thread that pauses as long
-    write_file("/probe/end_pause_60", "");
-    EXPECT_TRUE(eventually([] { return !exists("/probe/end_pause_60"); }));
-  };
-  for (int i = 0; i < 3; ++i) pass_a_minute();
-  usleep(100'000);
+  Minutes::end_the_first(log);
+  for (int i = 0; i < 2; ++i) Minutes::pass();
+  usleep(50'000);
   EXPECT_EQ(Texts{}, restarts());
   run("touch -d '-302 seconds' " + current_directory() + "/android.log");
   EXPECT_TRUE(eventually([&] {
-    pass_a_minute();
+    Minutes::pass();
     return restarts().size() >= 3;
   }));
   Texts first = restarts();
   first.resize(3);
   EXPECT_EQ((Texts{"logd", "logd-reinit", "corvexd"}), first);
   EXPECT_GT(log.count("/android.log last modified time : "), 0u);
+
+  send_commands({"LOGSTOP"});
+  Minutes::pass();
+  const size_t asked = restarts().size();
+  Minutes::expect_that_nobody_waits_for_one();
+  EXPECT_EQ(asked, restarts().size()) << "nothing is recorded that could be stale";
+}
+
+TEST_F(Collect, ACaptureThatComesLaterIsNotWatched) {
+  set_property("persist.sys.assert.panic", "false");
+  Daemon daemon(log);
+  Minutes::end_the_first(log);
+  send_commands({"LOGBEGIN"});
+  Minutes::expect_that_nobody_waits_for_one();
 }
 
 TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
