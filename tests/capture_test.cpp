@@ -1,9 +1,14 @@
 #include "capture/capture.h"
 
+#include <fcntl.h>
 #include <signal.h>
+#include <string.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <chrono>
+#include <iterator>
+#include <sstream>
 
 #include "tests/daemon.h"
 
@@ -19,7 +24,12 @@ bool lives(const ProbeReport& report) { return kill(report.pid, 0) == 0 && !has_
 
 TEST_F(Capture, EveryRecorderGetsItsVector) {
   switch_on({"main", "system", "radio", "event", "kernel", "tcpdump"});
-  set_property("persist.sys.radio.logsize", "77");
+  int number = 10;
+  for (const char* log : {"android", "radio", "event", "kernel", "tcpdump"}) {
+    for (const char* setting : {".logsize", ".lognum"}) {
+      set_property(std::string("persist.sys.") + log + setting, std::to_string(++number));
+    }
+  }
   set_property("persist.sys.lograw", "long format");
   set_property("persist.sys.loglevel", "*:E;reboot");
   Daemon daemon(log);
@@ -28,11 +38,11 @@ TEST_F(Capture, EveryRecorderGetsItsVector) {
   std::vector<ProbeReport> reports = probe_reports(5);
   const std::string format = " -v 'long format' *:E;reboot ''";
   EXPECT_EQ(
-      (Texts{"logcat -f " + dir + "/android.log -r 20480 -n 30 -b system -b main -b crash" + format,
-             "logcat -f " + dir + "/radio.log -r 77 -n 5 -b radio" + format,
-             "logcat -f " + dir + "/event.log -r 20480 -n 5 -b events" + format,
-             "logcat -f " + dir + "/kernel.log -r 20480 -n 5 -b kernel",
-             "tcpdump -i any -p -s 0 -C 100 -W 3 -w " + dir + "/tcpdump -Z system"}),
+      (Texts{"logcat -f " + dir + "/android.log -r 11 -n 12 -b system -b main -b crash" + format,
+             "logcat -f " + dir + "/radio.log -r 13 -n 14 -b radio" + format,
+             "logcat -f " + dir + "/event.log -r 15 -n 16 -b events" + format,
+             "logcat -f " + dir + "/kernel.log -r 17 -n 18 -b kernel",
+             "tcpdump -i any -p -s 0 -C 19 -W 20 -w " + dir + "/tcpdump -Z system"}),
       command_lines(reports));
   for (ProbeReport& report : reports) {
     report.rest.pop_back();
@@ -43,6 +53,78 @@ TEST_F(Capture, EveryRecorderGetsItsVector) {
   EXPECT_TRUE(eventually([&] { return read_file(dir + "/getprop.txt") == "[a]: [b]\n"; }));
 }
 
+// The names in a log directory, and those of the files in it that programs were told to write.
+Texts recorded_in(const std::string& directory) {
+  Texts names = list(directory);
+  for (const std::string& report : list("/probe")) {
+    const std::string text = read_file("/probe/" + report), file = "arg " + directory + "/";
+    const size_t at = text.find(file);
+    if (report.rfind("report.", 0) != 0 || at == text.npos) continue;
+    const size_t start = at + file.size();
+    names.push_back(text.substr(start, text.find('\n', start) - start));
+  }
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+TEST_F(Capture, EveryRecorderHasItsSwitchItsSourceAndItsFile) {
+  const std::string partition = "/dev/block/platform/soc/624000.ufshc/by-name/";
+  struct {
+    const char* name;
+    const char* file;
+    std::string node;
+  } rows[] = {{"main", "android.log", ""},
+              {"radio", "radio.log", ""},
+              {"event", "event.log", ""},
+              {"kernel", "kernel.log", "/nodes/kmsg"},
+              {"tcpdump", "tcpdump", ""},
+              {"qsee", "qsee.log", "/nodes/proc/tzdbg/qsee_log"},
+              {"tz", "tz.log", "/nodes/proc/tzdbg/tz_log"},
+              {"bootloader", "bootloader.log", "/nodes/proc/bootloader_log"},
+              {"pre_bootloader", "pre_bootloader.log", partition + "reserve1"}};
+  make_nodes();
+  run("mkdir -p " + partition);
+  switch_on({"kernel.kmsg"});
+  std::vector<int> ends;
+  for (const auto& row : rows) {
+    switch_on({row.name});
+    if (row.node == "") continue;
+    ends.push_back(open(row.node.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
+    write(ends.back(), row.name, strlen(row.name));
+  }
+  Daemon daemon(log, kDaemonWithNodes);
+  // First all of them, then all but one.
+  const char* off = "";
+  for (size_t round = 0; round <= std::size(rows); ++round) {
+    clear_probe_reports();
+    send_commands({"LOGBEGIN"});
+    const std::string directory = current_directory();
+    Texts expected = {"boot_log", "fileAfter911", "getprop.txt", "versionNumber"};
+    for (const auto& row : rows) {
+      if (row.name != off) expected.push_back(row.file);
+    }
+    std::sort(expected.begin(), expected.end());
+    EXPECT_TRUE(eventually([&] { return recorded_in(directory) == expected; })) << off << " is off";
+    for (const auto& row : rows) {
+      if (row.node == "" || round > 0) continue;
+      const std::string path = directory + "/" + row.file;
+      EXPECT_TRUE(eventually([&] { return read_file(path) == row.name; })) << path;
+      EXPECT_EQ(owners_work(), is_systems(path)) << path;
+    }
+    send_commands({"LOGSTOP"});
+    if (round > 0) switch_on({off});
+    off = rows[round % std::size(rows)].name;
+    set_property(std::string("persist.sys.") + off, "no");
+  }
+  for (int end : ends) close(end);
+  EXPECT_TRUE(eventually([&] {
+    std::istringstream children(read_file("/proc/" + std::to_string(daemon.pid()) + "/task/" +
+                                          std::to_string(daemon.pid()) + "/children"));
+    return std::count_if(std::istream_iterator<pid_t>(children), {},
+                         [](pid_t child) { return !has_ended(child); }) == 4;
+  })) << "the boot recorders";
+}
+
 TEST_F(Capture, SwitchesCountOnlyWhenExactlyYes) {
   struct {
     const char* main;
@@ -51,18 +133,19 @@ TEST_F(Capture, SwitchesCountOnlyWhenExactlyYes) {
   } rows[] = {{"yes", "no", " -n 30 -b main -b crash -v "},
               {"YES", "yes", " -n 30 -b system -b crash -v "},
               {"true", "yes ", ""}};
-  set_property("sys.debug.watchdog", "true");  // the shared-storage root
   set_property("persist.sys.kernel.kmsg", "yes");
   Daemon daemon(log);
+  set_property("sys.debug.watchdog", "true");  // the shared-storage root
   size_t started = 0;
   for (const auto& row : rows) {
     set_property("persist.sys.main", row.main);
     set_property("persist.sys.system", row.system);
     send_commands({"LOGBEGIN"});
     if (row.buffers != "") ++started;
-    Texts lines = command_lines(probe_reports(started));
+    const auto reports = probe_reports(started);
     send_commands({"LOGSTOP"});
-    EXPECT_NE(std::string::npos, lines.back().find(row.buffers));
+    EXPECT_NE(std::string::npos, command_lines(reports).back().find(row.buffers));
+    EXPECT_TRUE(eventually([&] { return has_ended(reports.back().pid); })) << row.main;
   }
   switch_on({"tcpdump"});
   send_commands({"LOGBEGIN"});

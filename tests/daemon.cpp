@@ -53,6 +53,25 @@ Daemon::Daemon(LogCatcher& log, const char* program)
   log.clear();
 }
 
+const char* const kDaemonWithNodes = "/probe/daemon";
+
+void make_nodes() {
+  run("rm -rf /nodes; mkdir -p /nodes/proc/tzdbg /real_proc; cd /nodes; ln -s /real_proc/self "
+      "proc; "
+      "mkfifo kmsg proc/tzdbg/qsee_log proc/tzdbg/tz_log; for name in "
+      "proc_transactions proc_transaction_log proc_state; do printf $name >proc/$name; done");
+  write_script(kDaemonWithNodes,
+               "exec unshare -m sh -c 'mount --rbind /proc /real_proc && mount --bind /nodes/kmsg "
+               "/dev/kmsg && mount --bind /nodes/proc /proc && exec /build/tests/corvexd_fast'");
+}
+
+size_t pauses(int seconds) {
+  const std::string all = "\n" + read_file("/probe/pauses"), line = "\n" + std::to_string(seconds);
+  size_t count = 0;
+  for (size_t at = 0; (at = all.find(line + "\n", at)) != all.npos; ++at) ++count;
+  return count;
+}
+
 std::string message(const std::string& command) {
   uint16_t length = static_cast<uint16_t>(command.size());
   return std::string(reinterpret_cast<char*>(&length), sizeof length) + command;
