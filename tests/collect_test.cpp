@@ -8,12 +8,17 @@
 
 #include <algorithm>
 #include <atomic>
+#include <functional>
 #include <map>
+#include <mutex>
+#include <sstream>
 #include <thread>
 
 #include "collect/artefact_mover.h"
 #include "collect/file_observer.h"
 #include "core/state.h"
+#include "storage/copy.h"
+#include "storage/current_directory.h"
 #include "storage/log_directory.h"
 #include "tests/daemon.h"
 #include "tests/device_root.h"
@@ -373,11 +378,27 @@ TEST_F(Collect, TagsFollowTheirSwitchesAndCommands) {
   EXPECT_TRUE(eventually([&] { return of_tags("VERBOSE") == 8 * 24; }));
   EXPECT_EQ("1", property("persist.oem.nfc.debug"));
   EXPECT_EQ("VERBOSE", property("log.tag.NFC"));
-  send_commands({"OEM_GPS_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE", "OEM_BT_DEBUG_DISABLE"});
-  EXPECT_EQ("VERBOSE", property("log.tag.GmsNetworkLocationProvi"));
-  EXPECT_EQ("INFO", property("log.tag.SnepServer"));
-  EXPECT_EQ("INFO", property("log.tag.DockService"));
-  EXPECT_EQ(8 * 64 + 24, of_tags("INFO"));
+  EXPECT_TRUE(eventually([] { return pauses(2) == 8; }));
+  struct {
+    const char* command;
+    const char* tag;  // one of them
+    const char* level;
+    size_t tags;
+  } rows[] = {{"OEM_BT_DEBUG_DISABLE", "log.tag.DockService", "INFO", 12},
+              {"OEM_BT_DEBUG_ENABLE", "log.tag.DockService", "VERBOSE", 12},
+              {"OEM_GPS_DEBUG_ENABLE", "log.tag.GmsNetworkLocationProvi", "VERBOSE", 64},
+              {"OEM_GPS_DEBUG_DISABLE", "log.tag.GmsNetworkLocationProvi", "INFO", 64},
+              {"OEM_NFC_DEBUG_DISABLE", "log.tag.SnepServer", "INFO", 12},
+              {"OEM_NFC_DEBUG_ENABLE", "log.tag.SnepServer", "VERBOSE", 12}};
+  for (const auto& row : rows) {
+    const size_t earlier = service.requests().size();
+    send_commands({row.command});
+    const auto requests = service.requests();
+    const std::map<std::string, std::string> set(requests.begin() + earlier, requests.end());
+    EXPECT_EQ(row.tags, set.size()) << row.command;
+    EXPECT_EQ(1u, set.count(row.tag)) << row.command;
+    for (const auto& [key, value] : set) EXPECT_EQ(row.level, value) << row.command << key;
+  }
   EXPECT_EQ("1", property("persist.oem.nfc.debug"));
 }
 
@@ -448,6 +469,10 @@ TEST_F(Collect, ACaptureThatComesLaterIsNotWatched) {
 TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   run("mkdir -p /vendor/bin");
   Daemon daemon(log);
+
+  install_probes("die");
+  send_commands({"CACHECLEAR"});
+  EXPECT_EQ(Texts{"logcat -c"}, command_lines(probe_reports(1)));
   for (const char* tool :
        {"/vendor/bin/pktlogconf", "/system/bin/pktlogconf", "/system/bin/iwpriv"}) {
     ASSERT_EQ(0, symlink("/build/tests/recorder_probe", tool));
