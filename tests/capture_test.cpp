@@ -24,6 +24,7 @@ bool lives(const ProbeReport& report) { return kill(report.pid, 0) == 0 && !has_
 
 TEST_F(Capture, EveryRecorderGetsItsVector) {
   switch_on({"main", "system", "radio", "event", "kernel", "tcpdump"});
+  run("mkdir /cache/recovery && echo log > /cache/recovery/last_log");
   int number = 10;
   for (const char* log : {"android", "radio", "event", "kernel", "tcpdump"}) {
     for (const char* setting : {".logsize", ".lognum"}) {
@@ -53,6 +54,7 @@ TEST_F(Capture, EveryRecorderGetsItsVector) {
   EXPECT_TRUE(eventually([&] { return read_file(dir + "/getprop.txt") == "[a]: [b]\n"; }));
 }
 
+  EXPECT_TRUE(eventually([&] { return read_file(dir + "/recovery/last_log") == "log\n"; }));
 // The names in a log directory, and those of the files in it that programs were told to write.
 Texts recorded_in(const std::string& directory) {
   Texts names = list(directory);

@@ -133,16 +133,19 @@ TEST_F(Copy, FolderTakesEveryPlainFileWhateverItsName) {
 }
 
 TEST_F(Copy, EarlierLogsLandInTheirFolders) {
-  run("mkdir -p /cache/log_before_initial /cache/lkmsg /data/anr /data/system/dropbox");
+  run("mkdir -p /cache/log_before_initial /cache/lkmsg /cache/recovery /data/anr "
+      "/data/system/dropbox");
   write_file("/cache/log_before_initial/android_initial.log", "initial");
   write_file("/cache/lkmsg/last", "kernel");
+  write_file("/cache/recovery/last", "recovery");
   write_file("/data/anr/same", "trace");
   write_file("/data/system/dropbox/same", "entry");
   write_file("/data/system/dropbox/other", "entry");
   copy_file_already_exist(nullptr);
-  EXPECT_EQ((Texts{"anr", "kmsg", "log_before_initial"}), list("/data/log"));
+  EXPECT_EQ((Texts{"anr", "kmsg", "log_before_initial", "recovery"}), list("/data/log"));
   EXPECT_EQ("initial", read_file("/data/log/log_before_initial/android_initial.log"));
   EXPECT_EQ("kernel", read_file("/data/log/kmsg/last"));
+  EXPECT_EQ("recovery", read_file("/data/log/recovery/last"));
   EXPECT_EQ("traceentry", read_file("/data/log/anr/same"));
   EXPECT_EQ("entry", read_file("/data/log/anr/other"));
 }
