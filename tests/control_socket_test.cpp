@@ -12,9 +12,9 @@ using ControlSocket = DeviceTest;
 
 TEST_F(ControlSocket, MessagesRunInOrderUpToTheFirstBadOne) {
   const std::string longest(1023, 'x'), change = message("CHANGEPATH");
-  const std::string printed = "print buf--", eof = "corvexd: eof\n";
-  const std::string reads = "corvexd watchdogProp : false, log_path : data \n";
-  const std::string chooses = "corvexd LOG_ROOT : /data/corvex\n";
+  const std::string printed = "I/print buf--", eof = "E/corvexd: eof\n";
+  const std::string reads = "I/corvexd watchdogProp : false, log_path : data \n";
+  const std::string chooses = "I/corvexd LOG_ROOT : /data/corvex\n";
   const struct {
     std::string bytes;
     Texts lines;
@@ -23,12 +23,12 @@ TEST_F(ControlSocket, MessagesRunInOrderUpToTheFirstBadOne) {
            message("CHANGEPATH\n") + message(longest),
        {printed + "CHANGEPATH \n", reads, chooses, printed + "CHANGEPATH \n", reads, chooses,
         printed + "changepath \n", printed + "CHANGEPATH\n \n", printed + longest + " \n", eof,
-        "failed to read size\n"}},
-      {"\1", {eof, "failed to read size\n"}},
-      {std::string("\0\0", 2) + change, {"invalid size 0\n"}},
-      {std::string("\0\4", 2) + change, {"invalid size 1024\n"}},
-      {"\xff\xff", {"invalid size 65535\n"}},
-      {change.substr(0, 7), {eof, "failed to read command\n"}},
+        "E/failed to read size\n"}},
+      {"\1", {eof, "E/failed to read size\n"}},
+      {std::string("\0\0", 2) + change, {"E/invalid size 0\n"}},
+      {std::string("\0\4", 2) + change, {"E/invalid size 1024\n"}},
+      {"\xff\xff", {"E/invalid size 65535\n"}},
+      {change.substr(0, 7), {eof, "E/failed to read command\n"}},
   };
   Daemon daemon(log);
   for (const auto& row : rows) {
@@ -37,10 +37,10 @@ TEST_F(ControlSocket, MessagesRunInOrderUpToTheFirstBadOne) {
     for (char byte : row.bytes) send(fd, &byte, 1, MSG_NOSIGNAL);
     close(fd);
     ASSERT_TRUE(log.has("closing connection\n"));
-    Texts lines = {"new connection\n"};
+    Texts lines = {"I/new connection\n"};
     lines.insert(lines.end(), row.lines.begin(), row.lines.end());
-    lines.push_back("closing connection\n");
-    EXPECT_EQ(lines, log.texts());
+    lines.push_back("I/closing connection\n");
+    EXPECT_EQ(lines, log.lines());
   }
 }
 

@@ -14,6 +14,7 @@ namespace {
 
 const struct sockaddr_un kAddress = {AF_UNIX, "/dev/socket/logdw"};
 constexpr size_t kHeaderSize = 11;
+constexpr char kLetters[] = "??VDIWEF";  // of the priorities
 
 bool holds(const std::string& text, const std::string& part) {
   return text.find(part) != std::string::npos;
@@ -51,7 +52,8 @@ void LogCatcher::collect() {
     ASSERT_EQ('\0', record[size - 1]);
     const char* tag = record + kHeaderSize + 1;
     std::lock_guard<std::mutex> lock(mutex_);
-    texts_.emplace_back(tag + strlen(tag) + 1);
+    lines_.push_back({kLetters[record[kHeaderSize] & 7], '/'});
+    lines_.back() += tag + strlen(tag) + 1;
   }
 }
 
@@ -64,12 +66,18 @@ void LogCatcher::catch_up() {
 }
 
 Texts LogCatcher::texts(const Texts& ignored) {
+  Texts all = lines(ignored);
+  for (std::string& line : all) line.erase(0, 2);
+  return all;
+}
+
+Texts LogCatcher::lines(const Texts& ignored) {
   catch_up();
   std::lock_guard<std::mutex> lock(mutex_);
   Texts kept;
-  std::copy_if(texts_.begin(), texts_.end(), std::back_inserter(kept), [&](const auto& text) {
+  std::copy_if(lines_.begin(), lines_.end(), std::back_inserter(kept), [&](const auto& line) {
     return std::none_of(ignored.begin(), ignored.end(),
-                        [&](const auto& part) { return holds(text, part); });
+                        [&](const auto& part) { return holds(line, part); });
   });
   return kept;
 }
@@ -89,7 +97,7 @@ size_t LogCatcher::count(const std::string& part) {
 void LogCatcher::clear() {
   catch_up();
   std::lock_guard<std::mutex> lock(mutex_);
-  texts_.clear();
+  lines_.clear();
 }
 
 }  // namespace corvexd::test

@@ -17,7 +17,9 @@ class LogCatcher {
   void stop();
 
   // Every line sent before the call, in the order of arrival, but those that hold a part ignored.
+  // The second way, each stands behind the letter of its priority and "/".
   Texts texts(const Texts& ignored = {});
+  Texts lines(const Texts& ignored = {});
   bool has(const std::string& text);      // exactly this line, waited for
   size_t count(const std::string& part);  // lines that hold `part`
   void clear();
@@ -29,7 +31,7 @@ class LogCatcher {
   int socket_ = -1;
   std::thread collector_;
   std::mutex mutex_;
-  Texts texts_;
+  Texts lines_;
   std::atomic<bool> caught_up_{false};
 };
 

@@ -23,6 +23,7 @@ class LogDirectory : public DeviceTest {
 TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
   set_property("ro.build.ota.versionname", "A.B.C");
   write_file("/cache/fileAfter911", "after");
+  write_file("/cache/fileBefore911", "before");
   run("rmdir /data/corvex");
   EXPECT_EQ(0, createLogDirectory());
   const std::string first = LOG_DIR.get().c_str();
@@ -30,22 +31,26 @@ TEST_F(LogDirectory, IsNumberedMarkedAndFilled) {
       "/data/corvex/KVBR_1--20[0-9][0-9]-[01][0-9]-[0-3][0-9]-[0-2][0-9]-"
       "[0-5][0-9]-[0-6][0-9]_current";
   EXPECT_EQ(0, fnmatch(pattern, first.c_str(), 0)) << first;
-  EXPECT_EQ((Texts{"boot_log", "fileAfter911", "versionNumber"}), list(first));
+  EXPECT_EQ((Texts{"boot_log", "fileAfter911", "fileBefore911", "versionNumber"}), list(first));
   EXPECT_EQ("A.B.C" + std::string(87, '\0'), read_file(first + "/versionNumber"));
   EXPECT_EQ("after", read_file(first + "/fileAfter911"));
+  EXPECT_EQ("before", read_file(first + "/fileBefore911"));
   EXPECT_EQ(0600u, mode_of(first + "/versionNumber"));
   for (const std::string& path : {std::string("/data/corvex"), first, first + "/boot_log"}) {
     EXPECT_EQ(0755u, mode_of(path)) << path;
     EXPECT_EQ(owners_work(), is_systems(path)) << path;
   }
-  const std::string made = "corvexd: Log Directory created successfully, path is ";
+  EXPECT_EQ(owners_work(), is_systems(first + "/versionNumber"));
+  const std::string made = "I/corvexd: Log Directory created successfully, path is ";
   EXPECT_EQ(
-      (Texts{"corvexd: pdir is null! \n", "corvexd: log dir is " + first + " \n",
+      (Texts{"E/corvexd: pdir is null! \n", "I/corvexd: log dir is " + first + " \n",
              made + "/data/corvex \n", made + first + " \n",
-             "corvexd: vn is " + first + "/versionNumber \n",
-             "corvexd: copy_file /cache/fileAfter911 '" + first + "/fileAfter911'",
-             "corvexd: copy_file '" + first + "/fileAfter911'", made + first + "/boot_log \n"}),
-      log.texts({"fail to chown"}))
+             "I/corvexd: vn is " + first + "/versionNumber \n",
+             "E/corvexd: copy_file /cache/fileAfter911 '" + first + "/fileAfter911'",
+             "E/corvexd: copy_file '" + first + "/fileAfter911'",
+             "E/corvexd: copy_file /cache/fileBefore911 '" + first + "/fileBefore911'",
+             "E/corvexd: copy_file '" + first + "/fileBefore911'", made + first + "/boot_log \n"}),
+      log.lines({"fail to chown"}))
       << "but what is said without root";
 
   makeLogAbsolutePath();

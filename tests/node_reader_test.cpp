@@ -165,15 +165,15 @@ TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
 
 TEST_F(Reader, PreBootloaderLogIsCopiedOnceAndErased) {
   const std::string kib_1(1024, 'a');
-  const std::string eof = "corvexd: eof, pre_bootloader log process continue \n";
+  const std::string eof = "E/corvexd: eof, pre_bootloader log process continue \n";
   struct {
     std::string content;
     size_t copied;
     Texts lines;
   } rows[] = {
       {numbered(40 << 10), 32 << 10, {}},
-      {'\0' + numbered(40 << 10), 0, {"reserve1 is null\n"}},
-      {kib_1 + kib_1 + '\0' + kib_1, 2048, {"reserve1 is null\n"}},
+      {'\0' + numbered(40 << 10), 0, {"E/reserve1 is null\n"}},
+      {kib_1 + kib_1 + '\0' + kib_1, 2048, {"E/reserve1 is null\n"}},
       {numbered(5000), 5000, {eof}},
       {"", 0, {eof}},
   };
@@ -187,7 +187,7 @@ TEST_F(Reader, PreBootloaderLogIsCopiedOnceAndErased) {
     std::string erased(32 << 10, '\0');
     if (row.content.size() > erased.size()) erased += row.content.substr(erased.size());
     EXPECT_EQ(erased, read_file(kPartition)) << "what lies beyond is not touched";
-    EXPECT_EQ(row.lines, log.texts());
+    EXPECT_EQ(row.lines, log.lines());
   }
   unlink(kPartition);
   ASSERT_EQ(0, symlink("/data", kPartition));
@@ -205,9 +205,9 @@ TEST_F(Reader, BootloaderLogIsCopiedToItsEnd) {
   log.clear();
   start(kTzReader);
   EXPECT_EQ(1, end());
-  EXPECT_EQ((Texts{"corvexd: tz log node can not be read: No such file or directory \n",
-                   "corvexd: Open /proc/tzdbg/tz_log Error No such file or directory\n"}),
-            log.texts());
+  EXPECT_EQ((Texts{"E/corvexd: tz log node can not be read: No such file or directory \n",
+                   "E/corvexd: Open /proc/tzdbg/tz_log Error No such file or directory\n"}),
+            log.lines());
   start(kBootloaderReader, "/data");
   EXPECT_EQ(1, end());
   EXPECT_TRUE(

@@ -2,6 +2,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <iterator>
 
 #include "early/boot_log.h"
 #include "early/initial_log.h"
@@ -25,6 +26,7 @@ bool listens() {
 TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   run("mkdir -p /vendor/etc && echo '/dev/d /data ext4 ro encryptable=x' > /vendor/etc/fstab.qcom");
   set_property("persist.sys.lograw", "long");
+  set_property("persist.sys.assert.panic", "1");  // which is not "true"
   BootingDaemon daemon;
   const std::string layout_line = "corvexd: installd fs upgrade not yet complete. Waiting...\n";
   const std::string mount_line = "corvexd: Waiting for internal sd be mounted... \n";
@@ -38,10 +40,16 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   EXPECT_FALSE(listens());
   write_file("/data/.layout_version", "4");
   ASSERT_TRUE(log.has(mount_line));
+  const char* others[][2] = {{"A", ""}, {"A", "false"}, {"B", "true"}, {"2", "true"}};
+  for (const auto& [mount, on_tempfs] : others) {
+    set_property("vold.internalSD.mount", mount);
+    set_property("ro.mount.tempfs", on_tempfs);
+    const size_t seen = log.count(mount_line);
+    EXPECT_TRUE(eventually([&] { return log.count(mount_line) > seen + 2; })) << mount << on_tempfs;
+    EXPECT_FALSE(listens());
+  }
+  EXPECT_GT(pauses(1), 2u * std::size(others));
   set_property("vold.internalSD.mount", "A");
-  EXPECT_TRUE(eventually([&] { return log.count(mount_line) > 3; }));
-  EXPECT_FALSE(listens());
-  set_property("ro.mount.tempfs", "true");
   ASSERT_TRUE(eventually(listens));
   const std::string boot = "logcat -f /cache/boot_log/";
   const std::string initial = "logcat -f /cache/log_before_initial/";
@@ -55,26 +63,34 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
                    initial + "event_initial.log -r 1024 -n 4 -b events"}),
             command_lines(probe_reports(7)))
       << "the settings are read between the two phases";
-  ASSERT_TRUE(log.has("corvexd: in function main, persist.sys.assert.panic = false\n"));
+  ASSERT_TRUE(log.has("corvexd: in function main, persist.sys.assert.panic = 1\n"));
 
-  const std::string made = "corvexd: Log Directory created successfully, path is ";
+  const std::string made = "I/corvexd: Log Directory created successfully, path is ";
   // The children's lines and the other threads' come in between; the last is the platform's own.
   Texts lines =
-      log.texts({"_boot_pid", "executeOnBootLogcat a", "executeOnBootLogcat k",
+      log.lines({"_boot_pid", "executeOnBootLogcat a", "executeOnBootLogcat k",
                  "executeOnBootLogcat event", "delete_file", "fail to chown", "Failed to read"});
   lines.erase(std::unique(lines.begin(), lines.end()), lines.end());
   lines.resize(std::min<size_t>(lines.size(), 11));
-  EXPECT_EQ((Texts{"corvexd main start\n", "put cache logs in /cache/ \n", "corvexd firing up\n",
-                   made + "/cache/boot_log \n", "corvexd: executeOnBootLogcat start \n",
-                   layout_line, mount_line, "corvexd watchdogProp : false, log_path : data \n",
-                   "corvexd LOG_ROOT : /data/corvex\n", made + "/cache/log_before_initial \n",
-                   "corvexd: in function main, persist.sys.assert.panic = false\n"}),
+  EXPECT_EQ((Texts{"I/corvexd main start\n", "I/put cache logs in /cache/ \n",
+                   "I/corvexd firing up\n", made + "/cache/boot_log \n",
+                   "E/corvexd: executeOnBootLogcat start \n", "E/" + layout_line, "E/" + mount_line,
+                   "I/corvexd watchdogProp : false, log_path : data \n",
+                   "I/corvexd LOG_ROOT : /data/corvex\n", made + "/cache/log_before_initial \n",
+                   "D/corvexd: in function main, persist.sys.assert.panic = 1\n"}),
             lines);
   EXPECT_EQ("false", property("oem.after.clear"));
   EXPECT_EQ(0775u, mode_of("/cache/boot_log"));
   EXPECT_EQ(0775u, mode_of("/cache/log_before_initial"));
   EXPECT_TRUE(log.has("corvexd: kernel_boot_pid \n"));
   EXPECT_TRUE(log.has("corvexd: executeOnBootLogcat event \n"));
+
+  write_file("/probe/end_pause_60", "");
+  EXPECT_TRUE(log.has("corvexd: executeOnBootLogcat stop \n"));
+  usleep(50'000);
+  EXPECT_EQ("", current_directory());
+  EXPECT_EQ(0u, log.count("copy folder"));
+  EXPECT_EQ("", property("persist.oem.nfc.debug"));
 }
 
 TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
@@ -85,12 +101,18 @@ TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
   set_property("vold.internalSD.mount", "1");
   BootingDaemon daemon;
   ASSERT_TRUE(log.has("corvexd: Waiting for restart framework... \n"));
-  set_property("vold.decrypt", "trigger_restart_min_framework");
-  usleep(100'000);
-  set_property("vold.internalSD.mount", "0");
-  set_property("vold.decrypt", "trigger_restart_framework");
-  usleep(100'000);
-  EXPECT_FALSE(listens());
+  const char* others[][2] = {{"", "1"},
+                             {"trigger_restart_min_framework", "1"},
+                             {"trigger_restart_framework", "0"},
+                             {"trigger_restart_framework", "A"}};
+  set_property("ro.mount.tempfs", "true");
+  for (const auto& [decrypt, mount] : others) {
+    set_property("vold.internalSD.mount", mount);
+    set_property("vold.decrypt", decrypt);
+    const size_t seen = pauses(1);
+    EXPECT_TRUE(eventually([&] { return pauses(1) > seen + 2; })) << decrypt << mount;
+    EXPECT_FALSE(listens());
+  }
   set_property("vold.internalSD.mount", "1");
   EXPECT_TRUE(eventually(listens));
   EXPECT_EQ(1u, log.count("Waiting for"));
@@ -141,9 +163,9 @@ TEST_F(Startup, EachBootSetsTheFilesOfTheLastOneAside) {
   make_device_ready();
   run("mkdir -p /cache/boot_log");
   const std::string area = "/cache/boot_log/";
-  for (const char* name :
-       {"android_boot.log", "android_boot.log.1", "event_boot.log", "event_boot.log.1",
-        "kernel_boot.log", "radio_boot.log", "radio_boot.log.1", "android_boot.log.pre"}) {
+  for (const char* name : {"android_boot.log", "android_boot.log.1", "event_boot.log",
+                           "event_boot.log.1", "kernel_boot.log", "kernel_boot.log.1",
+                           "radio_boot.log", "radio_boot.log.1", "android_boot.log.pre"}) {
     write_file(area + name, name);
   }
   run("mkdir -p /cache/boot_log/kernel_boot.log.pre/full");
@@ -151,8 +173,8 @@ TEST_F(Startup, EachBootSetsTheFilesOfTheLastOneAside) {
   ASSERT_TRUE(eventually(listens));
   EXPECT_EQ("android_boot.log", read_file(area + "android_boot.log.pre"));
   EXPECT_EQ((Texts{"android_boot.log.1.pre", "android_boot.log.pre", "event_boot.log.1.pre",
-                   "event_boot.log.pre", "kernel_boot.log", "kernel_boot.log.pre",
-                   "radio_boot.log.1.pre", "radio_boot.log.pre"}),
+                   "event_boot.log.pre", "kernel_boot.log", "kernel_boot.log.1.pre",
+                   "kernel_boot.log.pre", "radio_boot.log.1.pre", "radio_boot.log.pre"}),
             list("/cache/boot_log"));
   EXPECT_TRUE(
       log.has("corvexd: Rename /cache/boot_log/kernel_boot.log failed! Error: Is a directory\n"));
