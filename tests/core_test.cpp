@@ -2,14 +2,34 @@
 
 #include <errno.h>
 #include <fcntl.h>
+#include <signal.h>
 #include <stdlib.h>
+#include <sys/wait.h>
+#include <time.h>
 #include <unistd.h>
+
+#include <atomic>
 
 #include "core/directory.h"
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/state.h"
 #include "tests/device_root.h"
+#include "thermal/thermal_sampler.h"
+
+namespace {
+
+std::atomic<time_t> time_now{0};  // 0: as it is
+
+}  // namespace
+
+// The C library's, for all of this program.
+extern "C" time_t time(time_t* result) noexcept {
+  struct timespec now = {time_now, 0};
+  if (now.tv_sec == 0) clock_gettime(CLOCK_REALTIME, &now);
+  if (result != nullptr) *result = now.tv_sec;
+  return now.tv_sec;
+}
 
 namespace corvexd::test {
 namespace {
@@ -103,11 +123,35 @@ TEST_F(Core, AnOutputIsARegularFileThatNoLinkLeadsTo) {
   close(reader);
 }
 
-TEST_F(Core, LocalTimeFollowsTheZone) {
-  setenv("TZ", "<-0930>9:30", 1);
-  EXPECT_EQ(-9.5 * 3600, local_time().tm_gmtoff);
-  setenv("TZ", "<+0545>-5:45", 1);
-  EXPECT_EQ(5.75 * 3600, local_time().tm_gmtoff);
+TEST_F(Core, NamesTellTheLocalTime) {
+  struct {
+    time_t now;
+    const char* zone;
+    const char* name;
+    std::string record;  // a thermal record's name
+    std::string line;    // and what its first line begins with
+  } rows[] = {
+      {1772717829, "<-0930>9:30", "2026-03-05-04-07-09", "202635_479", "202635_4:7:9"},
+      {1798795799, "<-0930>9:30", "2026-12-31-23-59-59", "20261231_235959", "20261231_23:59:59"},
+      {1798740900, "<+0545>-5:45", "2027-01-01-00-00-00", "202711_000", "202711_0:0:0"}};
+  for (const auto& row : rows) {
+    setenv("TZ", row.zone, 1);
+    time_now = row.now;
+    EXPECT_STREQ(row.name, local_timestamp().c_str());
+    char standard[32];
+    const struct tm local = local_time();
+    strftime(standard, sizeof standard, "%Y-%m-%d-%H-%M-%S", &local);
+    EXPECT_STREQ(row.name, standard);
+    run("rm -rf /data/thermal && mkdir /data/thermal");
+    const pid_t sampler = fork();
+    if (sampler == 0) record_cpux_thermal("/data/thermal/", 0);
+    EXPECT_TRUE(eventually([&] {
+      return read_file("/data/thermal/" + row.record).rfind("datetime=" + row.line + ",", 0) == 0;
+    })) << row.line;
+    kill(sampler, SIGKILL);
+    waitpid(sampler, nullptr, 0);
+  }
+  time_now = 0;
   unsetenv("TZ");
 }
 

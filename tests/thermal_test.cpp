@@ -12,6 +12,10 @@ class Thermal : public DeviceTest {
  protected:
   Thermal() { run("rm -rf /sys && mkdir -p /sys"); }
 
+  static std::string frequency(int cpu) {
+    return "/sys/devices/system/cpu/cpu" + std::to_string(cpu) + "/cpufreq/cpuinfo_cur_freq";
+  }
+
   static std::string zone(int number) {
     return "/sys/class/thermal/thermal_zone" + std::to_string(number) + "/temp";
   }
@@ -33,7 +37,7 @@ Texts lines_of(const std::string& directory) {
 }
 
 TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
-  set_source("/sys/devices/system/cpu/cpu1/cpufreq/cpuinfo_cur_freq", "1804800\n");
+  set_source(frequency(1), "1804800\n");
   set_source(zone(0), "35000\n");
   set_source(zone(1), "");
   set_source(zone(2), "12345678901234567890123\n");
@@ -57,13 +61,22 @@ TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
                 "pa_therm0=        , pa_therm1=        , emmc_therm=        , msm_therm=        ",
             line);
   EXPECT_EQ(0600u, mode_of(directory + "/" + list(directory)[0]));
-  unlink(zone(0).c_str());
-  set_source(zone(3), "7\n");
+  run("rm -r " + zone(16));
+  std::string wanted;
+  for (int cpu = 0; cpu < 4; ++cpu) {
+    set_source(frequency(cpu), std::to_string(100 + cpu) + "\n");
+    wanted += ", cpu" + std::to_string(cpu) + "_freq=" + std::to_string(100 + cpu);
+  }
+  for (int i = 0; i < 17; ++i) {
+    set_source(zone(i), std::to_string(i) + "\n");
+    if (i < 11) wanted += ", tz_sensor" + std::to_string(i) + "=" + std::to_string(i);
+  }
+  wanted += ", pm8841_tz=11, pm8941_tz=12, pa_therm0=13, pa_therm1=14, emmc_therm=15, msm_therm=16";
   EXPECT_TRUE(eventually([&] {
     line = lines_of(directory).back();
-    return line.find(", tz_sensor0=        , ") != std::string::npos &&
-           line.find(", tz_sensor3=7, ") != std::string::npos;
-  }));
+    return line.substr(line.find(',')) == wanted;
+  })) << line;
+  EXPECT_GT(pauses(3), 0u);
 }
 
 TEST_F(Thermal, StopEndsTheLatestSamplerOnly) {
