@@ -181,6 +181,13 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
   EXPECT_TRUE(exists(first_directory.substr(0, first_directory.size() - 8)));
 }
 
+
+  install_probes("stubborn");
+  send_commands({"LOGBEGIN"});
+  const ProbeReport stubborn = probe_reports(9).back();
+  send_commands({"LOGSTOP"});
+  usleep(50'000);
+  EXPECT_TRUE(lives(stubborn)) << "SIGTERM, and only that, is sent to a recorder";
 // Ends that come together are delivered as one, which reaps one.
 TEST_F(Capture, EndedRecordersDoNotPileUp) {
   switch_on({"main", "radio", "event", "kernel", "tcpdump", "qsee", "tz", "bootloader"});

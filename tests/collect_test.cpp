@@ -498,3 +498,5 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
 
 }  // namespace
 }  // namespace corvexd::test
+  write_script("/system/bin/pktlogconf", "");
+  run("mv /system/bin/iwpriv /vendor/bin && mv /system/bin/pktlogconf /system/bin/iwpriv");

@@ -55,6 +55,8 @@ class Reader : public DeviceTest {
     return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
   }
 
+  size_t descriptors() const { return list("/proc/" + std::to_string(child_) + "/fd").size(); }
+
   // A rotated series, the oldest file first, must be the source again.
   static void expect_source_in(const std::string& name) {
     run("cd /data/log && cat $(ls -rv " + name + "*) | cmp - /data/source");
@@ -83,6 +85,7 @@ TEST_F(Reader, KernelLogKeepsEveryByteOverHundredsOfRotations) {
   start(kKernelReader, "/data/source");
   EXPECT_TRUE(eventually([&] { return log.count("offset 293") == 1; }));
   usleep(50'000);
+  EXPECT_LE(descriptors(), list("/proc/self/fd").size() + 2) << "its source and its output";
   EXPECT_EQ(-1, end(SIGTERM));
   EXPECT_EQ(294u, list("/data/log").size());
   expect_source_in("kernel.log");
@@ -149,6 +152,7 @@ TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
   auto feed = [source](const char* text) { EXPECT_GT(write(source, text, strlen(text)), 0); };
   feed("before");
   EXPECT_TRUE(eventually([] { return read_file("/data/log/kernel.log") == "before"; }));
+  const size_t held = descriptors();
   unlink("/data/log/kernel.log");
   feed("lost");
   EXPECT_TRUE(
@@ -156,6 +160,7 @@ TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
               "such file or directory\n"));
   feed("after");
   EXPECT_TRUE(eventually([] { return read_file("/data/log/kernel.log") == "after"; }));
+  EXPECT_EQ(held, descriptors());
   run("rm -r /data/log");
   feed("gone");
   EXPECT_EQ(1, end());

@@ -1,5 +1,6 @@
 // The Android platform as the host layer plays it, byte for byte.
 #include <android-base/logging.h>
+#include <android/log.h>
 #include <cutils/properties.h>
 #include <fcntl.h>
 #include <string.h>
@@ -37,6 +38,20 @@ TEST_F(Platform, LogRecordsHaveTheirBytes) {
   EXPECT_EQ(0, memcmp(record + 11, "\6corvexd\0xxx", 12)) << "the base library's lines, too";
   EXPECT_EQ('\0', record[11 + 4067]);
   close(socket);
+}
+
+TEST_F(Platform, ALineLeavesErrnoAsItWas) {
+  EXPECT_EQ(
+      0, status_in_child([] {
+        __android_log_set_logger([](const __android_logger_data*, const char*) { errno = EBADF; });
+        errno = EDOM;
+        log_info("line");
+        _exit(errno == EDOM ? 0 : 1);
+      }));
+  log.stop();
+  errno = EDOM;
+  log_info("a line for standard error");
+  EXPECT_EQ(EDOM, errno);
 }
 
 TEST_F(Platform, NoLineIsLostWhileTheLogDaemonReadsSlowly) {

@@ -194,6 +194,25 @@ TEST_F(Startup, NoLinkStandsForAnAreaOfTheCache) {
   EXPECT_EQ("kept", read_file("/probe/android_initial.log"));
 }
 
+TEST_F(Startup, TheOldestFileOfTheInitialPhaseGoesFirst) {
+  const std::string area = "/cache/log_before_initial/";
+  Texts names;
+  for (const char* stem : {"android_initial.log", "kernel_initial.log"}) {
+    for (const char* suffix : {".4", ".3", ".2", ".1", ""}) {
+      names.push_back(std::string(stem) + suffix);
+    }
+  }
+  run("mkdir " + area + " && cd " + area + " && touch event_initial.log.4");
+  for (const std::string& name : names) write_file(area + name, "");
+  for (const std::string& name : names) {
+    EXPECT_TRUE(exists(area + name));
+    EXPECT_TRUE(deleteFile());
+    EXPECT_FALSE(exists(area + name)) << name;
+  }
+  EXPECT_FALSE(deleteFile());
+  EXPECT_EQ(Texts{"event_initial.log.4"}, list(area));
+}
+
 TEST_F(Startup, TheInitialPhaseKeepsToItsSize) {
   const std::string area = "/cache/log_before_initial/";
   run("mkdir -p " + area + "below");
@@ -228,6 +247,12 @@ TEST_F(Startup, TheInitialPhaseKeepsToItsSize) {
   EXPECT_FALSE(exists(area + "android_initial.log.4"));
   EXPECT_TRUE(exists(area + "android_initial.log"));
   make("below/foreign", 15'000'000);
+  run("mkdir " + area + "kernel_initial.log.4");
+  next_check();
+  EXPECT_EQ((Texts{"below", "event_initial.log", "kernel_initial.log.2", "kernel_initial.log.4"}),
+            list(area))
+      << "what cannot be deleted waits for the next check";
+  run("rmdir " + area + "kernel_initial.log.4");
   next_check();
   EXPECT_EQ((Texts{"below", "event_initial.log"}), list(area)) << "events are never deleted";
 }
