@@ -52,7 +52,8 @@ class Collect : public DeviceTest {
 // A daemon that has its watches: what happens before, nobody sees.
 class Observer : public Daemon {
  public:
-  explicit Observer(LogCatcher& log) : Daemon(log) {
+  explicit Observer(LogCatcher& log, const char* program = "/build/tests/corvexd_fast")
+      : Daemon(log, program) {
     EXPECT_TRUE(eventually([this] { return watches() == 8; })) << "one directory is missing";
   }
 
@@ -94,7 +95,8 @@ std::string record(uint32_t mask, const std::string& name) {
 }
 
 TEST_F(Collect, EveryArtefactComesToItsPlace) {
-  Observer daemon(log);
+  make_nodes();
+  Observer daemon(log, kDaemonWithNodes);
   const std::string current = current_directory();
   struct {
     const char* commands;  // as the producers make the artefact
@@ -103,7 +105,9 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
       {"echo t > /data/tombstones/tombstone_core_00", {"tombstones/TIME/tombstone_core_00:t\n"}},
       {"echo a > /data/anr/anr_1",
        {"anr/TIME/anr_1:a\n", "anr/TIME/dumpsys_input:dumped input\n\n",
-        "anr/TIME/transactions:", "anr/TIME/transaction_log:", "anr/TIME/state:"}},
+        "anr/TIME/transactions:proc_transactions", "anr/TIME/transaction_log:proc_transaction_log",
+        "anr/TIME/state:proc_state"}},
+      {"echo A > /data/anr/anr_1", {"anr/TIME/anr_1:A\n"}},
       {"echo b > /data/anr/x_html.gz; echo c > /data/anr/BATTERY_trace_html.gz",
        {"x_html.gz:b\n", "BatteryHistory/BATTERY_trace_html.gz:c\n"}},
       {"echo d > /data/d; mv /data/d /data/system/dropbox/e; sleep 0.5; echo f > /data/d; "
@@ -256,15 +260,37 @@ TEST_F(Collect, WhatHasNoPlaceIsSaid) {
 TEST_F(Collect, AHangingDumpHoldsUpNobody) {
   write_script("/system/bin/getprop", "exec sleep 600");
   write_script("/system/bin/dumpsys", "exec sleep 600");
+// The listing has an order of its own.
+TEST_F(Collect, OfTwoMarksEachJobTakesItsOwn) {
+  write_script("/system/bin/bugreport", "");
   Observer daemon(log);
+  run("cd /data/corvex && mkdir a_current b_current && ls -U | grep _current > /probe/marked");
+  Texts marked;
+  std::istringstream listing(read_file("/probe/marked"));
+  for (std::string name; listing >> name;) marked.push_back("/data/corvex/" + name + "/");
+  ASSERT_EQ(3u, marked.size());
+  send_commands({"BUGREPORT", "CPUTHERMAL"});
+  write_file("/data/coredump/core_1", "core");
+  EXPECT_TRUE(eventually([&] { return exists(marked[2] + "coredump/core_1"); }));
+  EXPECT_TRUE(eventually([&] { return exists(marked[0] + "kv_tsen_data"); }));
+  run("ls " + marked[0] + "*-BUGREPORT.log");
+}
+
+  Observer daemon(log);
+  write_script("/system/bin/bugreport", "exec sleep 600");
   write_file("/data/anr/anr_1", "trace");
   write_file("/data/coredump/core_1", "core");
   const std::string current = current_directory();
+  const int client = connect_to_daemon();
+  send_all(client, message("BUGREPORT"));
+  EXPECT_TRUE(log.has("print buf--BUGREPORT \n"));
   EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_1"] == "core"; }));
   EXPECT_TRUE(eventually([&] { return files_below(current)["anr/TIME/anr_1"] == "trace"; }));
   EXPECT_EQ("CLEANFAILED", send_commands({"LOGBEGIN", "DELETELOG"}));
   EXPECT_EQ(1u, log.count("corvexd: shell_cmd is getprop > "));
   EXPECT_EQ(1u, log.count("corvexd: anr_input is /system/bin/dumpsys input | xargs -0 echo > " +
+  close(client);
+  run("pkill -KILL sleep");
                           current + "/anr/"));
   run("pkill -KILL sleep");
 }
