@@ -34,7 +34,9 @@ TEST_F(Capture, EveryRecorderGetsItsVector) {
   set_property("persist.sys.lograw", "long format");
   set_property("persist.sys.loglevel", "*:E;reboot");
   Daemon daemon(log);
+  const size_t waited = pauses(1);
   send_commands({"LOGBEGIN"});
+  EXPECT_EQ(waited + 2, pauses(1)) << "for the properties, and for the recorders to settle";
   const std::string dir = current_directory();
   std::vector<ProbeReport> reports = probe_reports(5);
   const std::string format = " -v 'long format' *:E;reboot ''";

@@ -98,6 +98,7 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
   make_nodes();
   Observer daemon(log, kDaemonWithNodes);
   const std::string current = current_directory();
+  size_t seconds = pauses(1);
   struct {
     const char* commands;  // as the producers make the artefact
     Texts places;          // path:content below the log directory
@@ -135,9 +136,11 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
           << " is " << files_below(current)[path];
     }
   }
+  EXPECT_EQ(seconds += 3, pauses(1)) << "for two names of traces and the directory named raw";
   write_file("/data/misc/display/raw_1", "r");
   EXPECT_TRUE(eventually([&] { return files_below(current)["rawdata/raw_1/raw_1"] == "rr"; }))
       << "once for its creation, once for its modification";
+  EXPECT_EQ(seconds += 2, pauses(1));
   EXPECT_EQ("0", property("debug.sf.dump"));
   EXPECT_TRUE(exists("/data/corvex/.nomedia"));
   EXPECT_TRUE(log.has("corvexd: open file failure. /data/system/dropbox/m"))
@@ -526,3 +529,4 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
 }  // namespace corvexd::test
   write_script("/system/bin/pktlogconf", "");
   run("mv /system/bin/iwpriv /vendor/bin && mv /system/bin/pktlogconf /system/bin/iwpriv");
+  EXPECT_EQ(4u, pauses(5)) << "each time in the daemon and in the tool's process";
