@@ -1,6 +1,9 @@
 // corvexctl as a program, against a daemon's end played by a thread on a real socket.
+#include <errno.h>
 #include <poll.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
+#include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -12,6 +15,8 @@
 namespace corvexd::test {
 namespace {
 
+const struct sockaddr_un kAddress = {AF_UNIX, "/dev/socket/corvexd"};
+
 class Client : public DeviceTest {
  protected:
   Client() { listen(listener_, 5); }
@@ -19,10 +24,10 @@ class Client : public DeviceTest {
 
   // Runs the program to its end; what it printed is in out_ and err_.
   int call(const std::string& arguments) {
-    int status =
-        system(("/build/client/corvexctl --socket " + path_ + arguments + " >/data/out 2>/data/err")
-                   .c_str());
-    out_ = read_file("/data/out");
+    int status = system(("/build/client/corvexctl --socket " + path_ + arguments + " >" +
+                         out_path_ + " 2>/data/err")
+                            .c_str());
+    out_ = out_path_ == "/dev/full" ? "" : read_file(out_path_);
     err_ = read_file("/data/err");
     return WEXITSTATUS(status);
   }
@@ -46,8 +51,47 @@ class Client : public DeviceTest {
 
   const std::string path_ = "/dev/socket/corvexd";
   int listener_ = bound_socket(SOCK_STREAM, path_.c_str());
-  std::string out_, err_;
+  std::string out_path_ = "/data/out", out_, err_;
 };
+
+// What the programs that have ended used, in seconds.
+double processor_time() {
+  struct rusage usage = {};
+  getrusage(RUSAGE_CHILDREN, &usage);
+  const struct timeval &user = usage.ru_utime, &system = usage.ru_stime;
+  return static_cast<double>(user.tv_sec + system.tv_sec) +
+         static_cast<double>(user.tv_usec + system.tv_usec) / 1e6;
+}
+
+TEST_F(Client, WaitsItsTurnAndTheRunAtNoProcessorTime) {
+  std::vector<int> queue;
+  while (queue.empty() || queue.back() != -1) {
+    queue.push_back(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (connect(queue.back(), reinterpret_cast<const sockaddr*>(&kAddress), sizeof kAddress) != 0) {
+      EXPECT_EQ(EAGAIN, errno);
+      close(queue.back());
+      queue.back() = -1;
+    }
+  }
+  std::string received;
+  std::thread peer([&] {
+    usleep(500'000);  // in which the queue stays full
+    for (size_t i = 1; i < queue.size(); ++i) {
+      close(accept4(listener_, nullptr, nullptr, SOCK_CLOEXEC));
+    }
+    const int connection = accept4(listener_, nullptr, nullptr, SOCK_CLOEXEC);
+    received = read_to_end(connection);
+    usleep(500'000);
+    close(connection);
+  });
+  const double before = processor_time();
+  EXPECT_EQ(0, call(" LOGSTOP")) << err_;
+  EXPECT_LT(processor_time() - before, 0.5);
+  shutdown(listener_, SHUT_RDWR);
+  peer.join();
+  EXPECT_EQ(message("LOGSTOP"), received);
+  for (int fd : queue) close(fd);
+}
 
 TEST_F(Client, SendsTheWordsInOrderInUpperCaseAndWaitsUntilTheyAreRun) {
   std::string received;
@@ -87,6 +131,33 @@ TEST_F(Client, SaysWhenADueReplyDidNotCome) {
   EXPECT_EQ(4, call_with(serve, " DELETELOG DELETELOG"));
   EXPECT_EQ("CLEANSUCCESS\n", out_);
   EXPECT_NE(std::string::npos, err_.find("without an answer to DELETELOG")) << err_;
+}
+
+TEST_F(Client, SaysWhenAnAnswerIsNone) {
+  const auto serve = [](int connection) {
+    read_to_end(connection);
+    send_all(connection, "CLEANSUCCESSCLEANED");
+  };
+  EXPECT_EQ(4, call_with(serve, " DELETELOG DELETELOG"));
+  EXPECT_EQ("CLEANSUCCESS\n", out_);
+  EXPECT_NE(std::string::npos, err_.find("no reply of the daemon")) << err_;
+}
+
+TEST_F(Client, ListsItsWordsAndOptions) {
+  EXPECT_EQ(0, call(" --list"));
+  EXPECT_EQ(16, std::count(out_.begin(), out_.end(), '\n'));
+  EXPECT_NE(std::string::npos, out_.find("LOGSTOP                end the capture\n")) << out_;
+  EXPECT_EQ(0, call(" --help"));
+  EXPECT_EQ(0u, out_.find("usage: ")) << out_;
+}
+
+TEST_F(Client, TellsWhatBecameOfItsWordsThoughNobodyCanReadTheAnswer) {
+  const auto serve = [](int connection) {
+    read_to_end(connection);
+    send_all(connection, "CLEANFAILED");
+  };
+  out_path_ = "/dev/full";
+  EXPECT_EQ(1, call_with(serve, " DELETELOG"));
 }
 
 TEST_F(Client, OutlivesADaemonThatGoesAwayAtOnce) {
