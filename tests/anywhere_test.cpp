@@ -2,10 +2,14 @@
 // well, on its processor and with its C library.
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <sys/mman.h>
 #include <sys/time.h>
+#include <unistd.h>
 
 #include <atomic>
 #include <chrono>
+#include <functional>
+#include <new>
 #include <thread>
 
 #include "capture/children.h"
@@ -16,6 +20,12 @@
 
 namespace corvexd::test {
 namespace {
+
+#ifdef CORVEX_SANITIZED
+constexpr bool kSanitized = true;
+#else
+constexpr bool kSanitized = false;
+#endif
 
 TEST(Anywhere, PathBufferKnowsWhatDidNotFit) {
   PathBuffer<8> buffer;
@@ -28,20 +38,62 @@ TEST(Anywhere, PathBufferKnowsWhatDidNotFit) {
   EXPECT_STREQ("a123456", buffer.c_str());
 }
 
-TEST(Anywhere, PublishedPathIsNeverAMixture) {
-  PublishedPath path;
-  EXPECT_STREQ("", path.get().c_str());
-  std::atomic<bool> done{false};
-  std::thread reader([&] {
-    while (!done) {
-      std::string text = path.get().c_str();
-      for (char c : text) ASSERT_EQ(text[0], c) << text;
-    }
-  });
-  for (int i = 0; i < 20'000; ++i) {
-    path.set(Path().append(std::string(i % 200, static_cast<char>('a' + i % 26)).c_str()));
+// A path that lies across two pages, the second of which cannot be touched: whoever comes to that,
+// in the middle of the text, finds out by a signal.
+class TornPath {
+ public:
+  TornPath()
+      : pages_(static_cast<char*>(
+            mmap(nullptr, 2 * size_, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0))),
+        path_(new (pages_ + size_ - 96) PublishedPath) {
+    signal(SIGSEGV, [](int) {
+      mprotect(torn->pages_ + size_, size_, PROT_READ | PROT_WRITE);
+      torn->meanwhile_();
+    });
+    torn = this;
   }
-  done = true;
+  ~TornPath() {
+    signal(SIGSEGV, SIG_DFL);
+    munmap(pages_, 2 * size_);
+  }
+
+  // Has this done when the next reader or writer is half through.
+  void tear(const std::function<void()>& meanwhile) {
+    meanwhile_ = meanwhile;
+    mprotect(pages_ + size_, size_, PROT_NONE);
+  }
+  PublishedPath* operator->() { return path_; }
+
+ private:
+  static inline TornPath* torn;
+  static inline const long size_ = sysconf(_SC_PAGESIZE);
+
+  char* pages_;
+  PublishedPath* path_;
+  std::function<void()> meanwhile_;
+};
+
+TEST(Anywhere, PublishedPathIsNeverAMixture) {
+  const Path first = Path().append(std::string(199, 'a').c_str());
+  const Path second = Path().append(std::string(190, 'b').c_str());
+  TornPath path;
+  EXPECT_STREQ("", path->get().c_str());
+  path->set(first);
+  path.tear([&] { path->set(second); });
+  EXPECT_STREQ(second.c_str(), path->get().c_str()) << "written while it was read";
+
+  if (kSanitized) return;  // the thread sanitizer holds a lock of its own while it stores a word
+  std::atomic<bool> done{false};
+  std::thread reader;
+  path.tear([&] {
+    reader = std::thread([&] {
+      EXPECT_STREQ(first.c_str(), path->get().c_str()) << "read while it was written";
+      done = true;
+    });
+    usleep(20'000);
+    EXPECT_FALSE(done) << "the writer is half through";
+  });
+  path->set(first);
   reader.join();
 }
 

@@ -1,5 +1,6 @@
 #include "capture/children.h"
 
+#include <pthread.h>
 #include <signal.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -156,6 +157,29 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
     if (pid < 0) break;
     EXPECT_EQ(1u, started.count(pid));
   }
+}
+
+// The C library's lock over its time zone goes into the child as it stands at the fork.
+bool looks_at_forks = false, fork_came_between = false;
+
+void look_at_fork() {
+  if (!looks_at_forks) return;
+  std::thread([] {
+    if (!local_time_mutex.try_lock()) return;
+    fork_came_between = true;
+    local_time_mutex.unlock();
+  }).join();
+}
+
+TEST_F(Children, NobodyIsInsideTheTimeZoneAtAFork) {
+  handle_ended_children();
+  ASSERT_EQ(0, pthread_atfork(look_at_fork, nullptr, nullptr));
+  looks_at_forks = true;
+  start_child(slots[0], end_at_once, nullptr);
+  looks_at_forks = false;
+  EXPECT_FALSE(fork_came_between);
+  EXPECT_TRUE(local_time_mutex.try_lock());
+  local_time_mutex.unlock();
 }
 
 struct Usage {

@@ -363,6 +363,46 @@ TEST_F(Collect, ACurrentDirectoryIsMadeBesideNoOther) {
   run("[ $(ls -d /data/corvex/*_current | wc -l) = 1 ]");
 }
 
+// Whoever looks for the mark and makes something below it waits while the mark is held, and then
+// finds it where it is by now.
+TEST_F(Collect, NobodyMakesAnythingWhileTheMarkPasses) {
+  checkLogPath();
+  write_file("/data/coredump/core", "core");
+  const std::string mark = "/data/corvex/a_current", next = "/data/corvex/b_current";
+  struct {
+    const char* job;
+    std::function<void()> body;
+    std::string starts_with;
+  } rows[] = {{"move", [] { movefile("/data/coredump/", "core"); }, mark},
+              {"copy", [] { copy_folder("/data/coredump/", "/anr/"); }, mark},
+              {"provide", [] { provide_current_directory(); }, ""},
+              {"begin", [] { begin_log_directory(); }, mark},
+              {"trace",
+               [] {
+                 ObserverState state;
+                 const std::string created = record(IN_CREATE, "anr_1");
+                 handle_events(state, created.data(), created.size());
+               },
+               mark}};
+  for (const auto& row : rows) {
+    run("rm -rf /data/corvex/*");
+    if (row.starts_with != "") mkdir(row.starts_with.c_str(), 0755);
+    LOG_DIR.set(Path().append(mark.c_str()));
+    std::unique_lock<std::mutex> lock(current_directory_mutex);
+    std::thread job(row.body);
+    usleep(30'000);
+    EXPECT_EQ(row.starts_with == "" ? 0u : 1u, list("/data/corvex").size()) << row.job;
+    EXPECT_EQ(Texts{}, list(mark)) << row.job;
+    rename(mark.c_str(), "/data/corvex/a");
+    mkdir(next.c_str(), 0755);
+    LOG_DIR.set(Path().append(next.c_str()));
+    lock.unlock();
+    job.join();
+    EXPECT_EQ(Texts{}, list("/data/corvex/a")) << row.job;
+    EXPECT_EQ(std::string(row.job) == "begin", exists("/data/corvex/b")) << row.job;
+  }
+}
+
 TEST_F(Collect, EventRecordsAreNotTrusted) {
   std::string records;
   for (const char* name : {"sixteen_letters!", "whole", "torn"})
