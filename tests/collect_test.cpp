@@ -260,9 +260,6 @@ TEST_F(Collect, WhatHasNoPlaceIsSaid) {
   EXPECT_EQ(1u, log.count("corvexd: open file failure. /data/misc/display//rrr"));
 }
 
-TEST_F(Collect, AHangingDumpHoldsUpNobody) {
-  write_script("/system/bin/getprop", "exec sleep 600");
-  write_script("/system/bin/dumpsys", "exec sleep 600");
 // The listing has an order of its own.
 TEST_F(Collect, OfTwoMarksEachJobTakesItsOwn) {
   write_script("/system/bin/bugreport", "");
@@ -279,21 +276,24 @@ TEST_F(Collect, OfTwoMarksEachJobTakesItsOwn) {
   run("ls " + marked[0] + "*-BUGREPORT.log");
 }
 
-  Observer daemon(log);
+TEST_F(Collect, AHangingDumpHoldsUpNobody) {
   write_script("/system/bin/bugreport", "exec sleep 600");
-  write_file("/data/anr/anr_1", "trace");
-  write_file("/data/coredump/core_1", "core");
-  const std::string current = current_directory();
+  write_script("/system/bin/getprop", "exec sleep 600");
+  write_script("/system/bin/dumpsys", "exec sleep 600");
+  Observer daemon(log);
   const int client = connect_to_daemon();
   send_all(client, message("BUGREPORT"));
   EXPECT_TRUE(log.has("print buf--BUGREPORT \n"));
+  write_file("/data/anr/anr_1", "trace");
+  write_file("/data/coredump/core_1", "core");
+  const std::string current = current_directory();
   EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_1"] == "core"; }));
   EXPECT_TRUE(eventually([&] { return files_below(current)["anr/TIME/anr_1"] == "trace"; }));
+  close(client);
+  run("pkill -KILL sleep");
   EXPECT_EQ("CLEANFAILED", send_commands({"LOGBEGIN", "DELETELOG"}));
   EXPECT_EQ(1u, log.count("corvexd: shell_cmd is getprop > "));
   EXPECT_EQ(1u, log.count("corvexd: anr_input is /system/bin/dumpsys input | xargs -0 echo > " +
-  close(client);
-  run("pkill -KILL sleep");
                           current + "/anr/"));
   run("pkill -KILL sleep");
 }
@@ -469,6 +469,10 @@ TEST_F(Collect, TagsFollowTheirSwitchesAndCommands) {
     for (const auto& [key, value] : set) EXPECT_EQ(row.level, value) << row.command << key;
   }
   EXPECT_EQ("1", property("persist.oem.nfc.debug"));
+
+  install_probes("die");
+  send_commands({"CACHECLEAR"});
+  EXPECT_EQ(Texts{"logcat -c"}, command_lines(probe_reports(1)));
 }
 
 class Minutes {
@@ -538,14 +542,10 @@ TEST_F(Collect, ACaptureThatComesLaterIsNotWatched) {
 TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   run("mkdir -p /vendor/bin");
   Daemon daemon(log);
-
-  install_probes("die");
-  send_commands({"CACHECLEAR"});
-  EXPECT_EQ(Texts{"logcat -c"}, command_lines(probe_reports(1)));
-  for (const char* tool :
-       {"/vendor/bin/pktlogconf", "/system/bin/pktlogconf", "/system/bin/iwpriv"}) {
+  for (const char* tool : {"/vendor/bin/pktlogconf", "/system/bin/iwpriv"}) {
     ASSERT_EQ(0, symlink("/build/tests/recorder_probe", tool));
   }
+  write_script("/system/bin/pktlogconf", "");
   send_commands({"WIFI_SNIFFLOG_STOP", "WIFI_SNIFFLOG_START"});
   std::vector<ProbeReport> first = probe_reports(3);
   ASSERT_EQ(3u, first.size());
@@ -557,8 +557,10 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   EXPECT_TRUE(log.has("wifi_snifflog_stop"));
   EXPECT_TRUE(log.has("corvexd:wifi_snifflog_start...sniff_set...\n"));
   EXPECT_TRUE(log.has("corvexd:wifi_snifflog_start...sniff_start....\n"));
+  run("mv /system/bin/iwpriv /vendor/bin && mv /system/bin/pktlogconf /system/bin/iwpriv");
   send_commands({"WIFI_SNIFFLOG_START"});
   EXPECT_EQ(5u, probe_reports(5).size());
+  EXPECT_EQ(4u, pauses(5)) << "each time in the daemon and in the tool's process";
   EXPECT_TRUE(eventually([&] {
     return std::count_if(first.begin(), first.end(),
                          [](const auto& report) { return has_ended(report.pid); }) == 2;
@@ -567,6 +569,3 @@ TEST_F(Collect, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
 
 }  // namespace
 }  // namespace corvexd::test
-  write_script("/system/bin/pktlogconf", "");
-  run("mv /system/bin/iwpriv /vendor/bin && mv /system/bin/pktlogconf /system/bin/iwpriv");
-  EXPECT_EQ(4u, pauses(5)) << "each time in the daemon and in the tool's process";

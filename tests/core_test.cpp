@@ -49,6 +49,15 @@ TEST_F(Core, SettingsComeFromTheirPropertiesOrDefaults) {
   EXPECT_STREQ("5", radio_lognum) << "a number that does not fit is refused, not cut";
   EXPECT_STREQ("007", tcpdump_logsize);
   EXPECT_EQ(1u, log.count("persist.sys.radio.lognum is too long"));
+  run("rm /dev/__properties__/*");
+  loadSettings();
+  const Texts defaults = {lograw,         loglevel,      maskothers,   android_logsize,
+                          android_lognum, event_logsize, event_lognum, kernel_logsize,
+                          kernel_lognum,  radio_logsize, radio_lognum, tcpdump_logsize,
+                          tcpdump_lognum};
+  EXPECT_EQ((Texts{"threadtime", "*:V", "", "20480", "30", "20480", "5", "20480", "5", "20480", "5",
+                   "100", "3"}),
+            defaults);
 }
 
 TEST_F(Core, LogRootFollowsItsTwoProperties) {
@@ -69,15 +78,6 @@ TEST_F(Core, LogRootFollowsItsTwoProperties) {
     EXPECT_EQ(row.in_data, isInDataPartition == 1);
   }
 }
-  run("rm /dev/__properties__/*");
-  loadSettings();
-  const Texts defaults = {lograw,         loglevel,      maskothers,   android_logsize,
-                          android_lognum, event_logsize, event_lognum, kernel_logsize,
-                          kernel_lognum,  radio_logsize, radio_lognum, tcpdump_logsize,
-                          tcpdump_lognum};
-  EXPECT_EQ((Texts{"threadtime", "*:V", "", "20480", "30", "20480", "5", "20480", "5", "20480", "5",
-                   "100", "3"}),
-            defaults);
 
 // What somebody may have put where the daemon is to write, and what becomes of the daemon's opening
 // it. The target, which stands outside, keeps its content and its owner.

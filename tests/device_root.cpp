@@ -94,6 +94,7 @@ void make_empty_device() {
 
 DeviceTest::DeviceTest() {
   umask(077);
+  signal(SIGCHLD, SIG_DFL);  // an earlier test's handler would reap what is waited for here
   make_empty_device();
   install_probes("live");
   log.start();
