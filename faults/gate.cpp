@@ -1,9 +1,9 @@
 // Stands before the daemon's main: stops until somebody traces the process and lets it go on.
 //
-// The tracer counts calls separately for each thread and child, and fails "the Nth call" of every
-// one of them. So that a fault can be meant for the main thread alone or for all others, the main
-// thread first makes kShieldCalls vain calls of that kind: its own calls come after that number,
-// and nobody else makes as many.
+// The tracer counts calls separately for each thread and child, and disturbs "the Nth call" of
+// every one of them. So that a fault can be meant for the main thread alone or for all others, the
+// main thread first makes kShieldCalls vain calls of that kind: its own calls come after that
+// number, and nobody else makes as many. The signal that kills is ignored meanwhile.
 #include <errno.h>
 #include <signal.h>
 #include <stdlib.h>
@@ -18,9 +18,11 @@ __attribute__((constructor)) void wait_at_gate() {
   raise(SIGSTOP);
   const char* number = getenv(corvexd::faults::kShieldVariable);
   if (number == nullptr) return;
+  signal(corvexd::faults::kKillingSignal, SIG_IGN);
   for (int i = 0; i < corvexd::faults::kShieldCalls; ++i) {
     syscall(strtol(number, nullptr, 10), -1, -1, -1, -1, -1, -1);  // fails whatever it is
   }
+  signal(corvexd::faults::kKillingSignal, SIG_DFL);
   unsetenv(corvexd::faults::kShieldVariable);
 }
 

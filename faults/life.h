@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "faults/trace.h"
+#include "faults/device.h"
 #include "faults/traced_daemon.h"
 
 namespace corvexd::faults {
@@ -12,14 +12,12 @@ namespace corvexd::faults {
 struct Life {
   std::vector<Call> calls;
   std::vector<std::string> log;
-  std::vector<std::string> problems;  // what no fault may lead to
-  int status = -1;                    // the daemon ended by itself with it
+  Achievements achieved;
+  std::vector<std::string> problems;  // what nothing may lead to
+  int status = -1;                    // the daemon ended with it
 };
 
-// Makes the calling process's device root ready for lives.
-void prepare_root();
-
-// Lives one life. With no fault every call named in `traced` is recorded, else what was injected.
+// Lives one life. With no fault every call named in `traced` is recorded, else what was disturbed.
 Life live(const Fault* fault, const std::string& traced);
 
 }  // namespace corvexd::faults

@@ -1,11 +1,15 @@
-// The daemon with a tracer at it that lets its calls fail.
+// The daemon with a tracer at it that disturbs its calls.
 #pragma once
 
+#include <signal.h>
 #include <sys/types.h>
 #include <time.h>
 #include <unistd.h>
 
+#include <functional>
+#include <mutex>
 #include <string>
+#include <vector>
 
 namespace corvexd::faults {
 
@@ -13,20 +17,35 @@ constexpr char kShieldVariable[] = "CORVEX_SHIELD_CALL";
 constexpr int kShieldCalls = 1000;
 constexpr int kPatience = 15;  // seconds, for what takes milliseconds
 
-// The `when`th call of the main thread, or of every other thread and child, does not take place.
+// Ends who gets it like SIGKILL does, as the daemon leaves it alone; but it can be ignored.
+constexpr int kKillingSignal = SIGUSR2;
+
+enum class Mode { kFail, kKill, kDelay };
+
+// What becomes of the `when`th call of the main thread, or of that of every other thread and child.
 struct Fault {
-  std::string call;
+  Mode mode;
+  const char* call;
   long number;          // of the call, as the kernel knows it
-  std::string outcome;  // as the tracer takes it: "error=EIO", "retval=1"
-  bool lasting;         // and none after it
+  const char* outcome;  // as the tracer takes it: "error=EIO", "retval=1", "delay_enter=1000"
+  bool lasting;         // and of every call after it
   bool in_main;
   int when;
 };
 
+// A call that was traced.
+struct Call {
+  bool in_main;
+  int when;  // the how manyth of its name on its thread
+  std::string name;
+  std::string site;     // the chain of return addresses inside the daemon
+  std::string callers;  // the daemon's functions, outermost first
+};
+
 // Asks until it is so, or patience ends.
 template <typename Done>
-bool wait_until(const Done& done) {
-  const time_t end = time(nullptr) + kPatience;
+bool wait_until(const Done& done, int patience = kPatience) {
+  const time_t end = time(nullptr) + patience;
   while (!done()) {
     if (time(nullptr) > end) return false;
     usleep(1000);
@@ -34,34 +53,42 @@ bool wait_until(const Done& done) {
   return true;
 }
 
-// A file of /proc, whose process may end at any moment.
-std::string read_facts(const std::string& path);
-
 // The daemon at its gate, started as init does it, and in a session by which all its descendants
-// are found; with its end they end.
+// are found. When it has ended they are ended, as init does that, too.
 class TracedDaemon {
  public:
-  // With no fault every call named in `traced` is written down, else what was injected.
+  // With a fault it is disturbed, and what failed is written down; else every call named in
+  // `traced` is. With neither it lives alone.
   TracedDaemon(const Fault* fault, const std::string& traced);
-  ~TracedDaemon();
+  ~TracedDaemon() { end(); }
 
   TracedDaemon(const TracedDaemon&) = delete;
   TracedDaemon& operator=(const TracedDaemon&) = delete;
 
   pid_t pid() const { return pid_; }
-  bool has_ended();
+  bool has_ended();    // and its descendants with it
+  int status() const;  // as a shell shows it
 
-  // As a shell shows it.
-  int status() const;
+  // Whether the tracer holds up one of its threads or children for longer than each stop takes.
+  bool stands_still() const;
 
-  // Takes the tracer away; the daemon goes on.
-  void let_go();
+  // Nanoseconds of processor time of the daemon and the children that run its code.
+  long processor_time() const;
+
+  // Takes the tracer away; the daemon goes on. Returns the calls that it wrote down.
+  std::vector<Call> let_go();
+
+  // Kills it and all its descendants.
+  void end();
 
  private:
+  void kill_all() const;
   void attach(const Fault* fault, const std::string& traced);
-  bool kill_session() const;
+  void for_each_process(const std::function<void(const std::string& folder)>& visit) const;
 
+  const bool only_disturbed_;
   pid_t pid_ = 0, tracer_ = 0;
+  std::mutex mutex_;  // over what follows
   bool ended_ = false;
   int status_ = 0;
 };
