@@ -100,7 +100,8 @@ class Client {
  private:
   int connect_while_it_lives() {
     int fd = -1;
-    bool settled = wait_until([&] { return (fd = try_to_connect()) != -1 || daemon_.has_ended(); });
+    bool settled = wait_until([&] { return (fd = try_to_connect()) != -1 || daemon_.has_ended(); },
+                              may_give_up_ ? kPatience / 4 : kPatience);
     gave_up_ = !settled && may_give_up_;
     if (!settled && !may_give_up_) problems_.emplace_back("does not serve");
     return fd;

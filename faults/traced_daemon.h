@@ -15,7 +15,7 @@ namespace corvexd::faults {
 
 constexpr char kShieldVariable[] = "CORVEX_SHIELD_CALL";
 constexpr int kShieldCalls = 1000;
-constexpr int kPatience = 15;  // seconds, for what takes milliseconds
+constexpr int kPatience = 60;  // seconds, for what takes milliseconds unless all are busy
 
 // Ends who gets it like SIGKILL does, as the daemon leaves it alone; but it can be ignored.
 constexpr int kKillingSignal = SIGUSR2;

@@ -1,6 +1,7 @@
 #include "faults/verdict.h"
 
 #include <algorithm>
+#include <map>
 #include <regex>
 #include <sstream>
 
@@ -12,6 +13,18 @@ bool holds(const std::string& text, const char* part) {
 }
 
 constexpr size_t kNamed = 3;  // of what is lost
+
+// What each life without faults achieves, or the daemon itself is broken.
+constexpr const char* kRequired[] = {"one mark",
+                                     "a name in the new zone",
+                                     "deletion answered CLEANSUCCESS",
+                                     "what was deleted is gone",
+                                     "LOGS/TIME/versionNumber not empty",
+                                     "LOGS/TIME/old whole",
+                                     "LOGS/TIME/kernel.log not empty",
+                                     "LOGS/TIME/anr/TIME/anr_open whole",
+                                     "LOGS/TIME/tombstones/TIME/tombstone_last whole",
+                                     "LOGS/TIME/tombstones/TIME/tombstone_after whole"};
 
 // What may be lost without a word.
 constexpr struct {
@@ -52,11 +65,18 @@ bool says_something_unusual(const Life& life, const Normal& normal) {
   });
 }
 
-// One that does not take no for an answer uses up all the refusals there are; but the start waits,
-// with pauses, as long as it must.
+// Who asks again after a pause, or for something else.
+constexpr const char* kAsksAgain[] = {"wait_for_", "record_cpux_thermal", "property_"};
+
+// One that does not take no for an answer uses up all the refusals there are.
 bool is_stubborn(const Life& life) {
-  auto is_impatient = [](const Call& call) { return !holds(call.callers, "wait_for_"); };
-  return std::count_if(life.calls.begin(), life.calls.end(), is_impatient) > kShieldCalls / 2;
+  std::map<std::string, int> refusals;
+  return std::any_of(life.calls.begin(), life.calls.end(), [&](const Call& call) {
+    bool may_ask = std::any_of(std::begin(kAsksAgain), std::end(kAsksAgain),
+                               [&](const char* caller) { return holds(call.callers, caller); });
+    // Where a library hides the callers, who asks is not known.
+    return !may_ask && !call.site.empty() && ++refusals[call.site] > kShieldCalls / 2;
+  });
 }
 
 void judge_losses(const Fault* fault, const Normal& normal, Life& life) {
@@ -85,6 +105,7 @@ void add_to_normal(const Life& life, bool first, Normal& normal) {
     auto found = life.achieved.find(name);
     times = std::min(times, found == life.achieved.end() ? 0 : found->second);
   }
+  for (const char* name : kRequired) normal.achieved[name] = std::max(normal.achieved[name], 1);
 }
 
 std::string write_normal(const Normal& normal) {
