@@ -54,15 +54,15 @@ bool may_end_at(const Call& call) {
   return false;
 }
 
-std::string without_numbers(const std::string& line) {
+// A line of the log among what was achieved.
+std::string said(const std::string& line) {
   static const std::regex number("[0-9]+|\n");
-  return std::regex_replace(line, number, "#");
+  return "says " + std::regex_replace(line, number, "#");
 }
 
 bool says_something_unusual(const Life& life, const Normal& normal) {
-  return std::any_of(life.log.begin(), life.log.end(), [&](const std::string& line) {
-    return normal.lines.count(without_numbers(line)) == 0;
-  });
+  return std::any_of(life.log.begin(), life.log.end(),
+                     [&](const std::string& line) { return normal.count(said(line)) == 0; });
 }
 
 // Who asks again after a pause, or for something else.
@@ -86,7 +86,7 @@ void judge_losses(const Fault* fault, const Normal& normal, Life& life) {
   if (fails && (may_be_silent || says_something_unusual(life, normal))) return;
   std::string lost;
   size_t count = 0;
-  for (const auto& [name, times] : normal.achieved) {
+  for (const auto& [name, times] : normal) {
     // What a recorder had in hand when the disturbance ended it is gone.
     if (is_delayed && name.rfind("LOGS/", 0) == 0 && !holds(name, " whole")) continue;
     if (life.achieved[name] < times && ++count <= kNamed) lost += (count == 1 ? "" : ", ") + name;
@@ -99,32 +99,28 @@ void judge_losses(const Fault* fault, const Normal& normal, Life& life) {
 }  // namespace
 
 void add_to_normal(const Life& life, bool first, Normal& normal) {
-  for (const std::string& line : life.log) normal.lines.insert(without_numbers(line));
-  if (first) normal.achieved = life.achieved;
-  for (auto& [name, times] : normal.achieved) {
+  for (auto& [name, times] : normal) {
     auto found = life.achieved.find(name);
     times = std::min(times, found == life.achieved.end() ? 0 : found->second);
   }
-  for (const char* name : kRequired) normal.achieved[name] = std::max(normal.achieved[name], 1);
+  if (first) normal = life.achieved;
+  for (const char* name : kRequired) normal[name] = std::max(normal[name], 1);
+  for (const std::string& line : life.log) normal[said(line)] = 0;
 }
 
 std::string write_normal(const Normal& normal) {
   std::string text;
-  for (const auto& [name, times] : normal.achieved)
-    text += std::to_string(times) + " " + name + "\n";
-  text += "\n";
-  for (const std::string& line : normal.lines) text += line + "\n";
+  for (const auto& [name, times] : normal) text += std::to_string(times) + " " + name + "\n";
   return text;
 }
 
 Normal read_normal(const std::string& text) {
   Normal normal;
   std::istringstream lines(text);
-  for (std::string line; std::getline(lines, line) && !line.empty();) {
-    const size_t blank = line.find(' ');
-    normal.achieved[line.substr(blank + 1)] = atoi(line.c_str());
+  int times;
+  for (std::string name; lines >> times && lines.get() && std::getline(lines, name);) {
+    normal[name] = times;
   }
-  for (std::string line; std::getline(lines, line);) normal.lines.insert(line);
   return normal;
 }
 

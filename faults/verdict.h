@@ -1,18 +1,15 @@
 // What the daemon may do when its calls are disturbed, and must.
 #pragma once
 
-#include <set>
 #include <string>
 
 #include "faults/life.h"
 
 namespace corvexd::faults {
 
-// What lives without faults have in common.
-struct Normal {
-  Achievements achieved;        // at least
-  std::set<std::string> lines;  // of the log, without numbers; those of any such life
-};
+// What every life without faults achieves at least; and, as nothing more than known, each line
+// that one of them logs.
+using Normal = Achievements;
 
 // Takes a life without faults into account; `first` for the first one.
 void add_to_normal(const Life& life, bool first, Normal& normal);
