@@ -250,11 +250,13 @@ class Story {
     look_at(path, outside_);
   }
 
-  // Waits until the last artefact has been seen to, if it ever is.
+  // Waits until the last artefact and the thermal record are there, if they ever are.
   void finish_artefacts(const std::string& tombstone) {
     make_artefact("/data/tombstones/" + tombstone);
-    const std::string wanted = kTombstones + tombstone + " whole";
-    wait_for([&] { return has_come(wanted); });
+    for (const std::string& wanted : {kTombstones + tombstone + " whole",
+                                      std::string("LOGS/TIME/kv_tsen_data/#_# not empty")}) {
+      wait_for([&] { return has_come(wanted); });
+    }
     settle();
   }
 
