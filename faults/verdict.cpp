@@ -35,7 +35,8 @@ constexpr struct {
     {"inotify_add_watch", ""},  // a directory that is not there is not watched
     {"read", "copy_file"},      // what can be copied is
     {"write", "copy_file"},
-    {"clone", "file_observer"},  // a trace without its dump is better than none
+    {"clone", "file_observer"},   // a trace without its dump is better than none
+    {"", "open_program_output"},  // told on standard error, where a shell would tell it
 };
 
 bool is_silent(const Call& call) {
