@@ -277,7 +277,7 @@ TEST_F(Collect, OfTwoMarksEachJobTakesItsOwn) {
 }
 
 TEST_F(Collect, AHangingDumpHoldsUpNobody) {
-  write_script("/system/bin/bugreport", "exec sleep 600");
+  write_script("/system/bin/bugreport", "until [ -e /probe/go_on ]; do sleep 0.01; done");
   write_script("/system/bin/getprop", "exec sleep 600");
   write_script("/system/bin/dumpsys", "exec sleep 600");
   Observer daemon(log);
@@ -290,7 +290,7 @@ TEST_F(Collect, AHangingDumpHoldsUpNobody) {
   EXPECT_TRUE(eventually([&] { return files_below(current)["coredump/core_1"] == "core"; }));
   EXPECT_TRUE(eventually([&] { return files_below(current)["anr/TIME/anr_1"] == "trace"; }));
   close(client);
-  run("pkill -KILL sleep");
+  write_file("/probe/go_on", "");
   EXPECT_EQ("CLEANFAILED", send_commands({"LOGBEGIN", "DELETELOG"}));
   EXPECT_EQ(1u, log.count("corvexd: shell_cmd is getprop > "));
   EXPECT_EQ(1u, log.count("corvexd: anr_input is /system/bin/dumpsys input | xargs -0 echo > " +
