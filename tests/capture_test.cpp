@@ -9,6 +9,7 @@
 #include <chrono>
 #include <iterator>
 #include <sstream>
+#include <utility>
 
 #include "tests/daemon.h"
 
@@ -184,10 +185,16 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
 
   install_probes("stubborn");
   send_commands({"LOGBEGIN"});
-  const ProbeReport stubborn = probe_reports(9).back();
-  send_commands({"LOGSTOP"});
-  usleep(50'000);
-  EXPECT_TRUE(lives(stubborn)) << "SIGTERM, and only that, is sent to a recorder";
+  const ProbeReport killed = probe_reports(9)[7], stubborn = probe_reports(9)[8];
+  EXPECT_TRUE(eventually([] { return exists(current_directory() + "/getprop.txt"); }));
+  for (const auto& [stopped, recorder] : {std::pair("0", killed), std::pair("1", stubborn)}) {
+    kill(recorder.pid, SIGKILL);
+    EXPECT_TRUE(log.has(std::string("corvexd: stop_logcat : ") + stopped +
+                        ", pid = " + std::to_string(recorder.pid) + "\n"));
+    send_commands({"LOGSTOP"});
+    usleep(50'000);
+    EXPECT_EQ(recorder.pid == killed.pid, lives(stubborn)) << "SIGTERM, and only that, is sent";
+  }
 }
 
 // Ends that come together are delivered as one, which reaps one.

@@ -143,6 +143,7 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
   EXPECT_EQ(seconds += 2, pauses(1));
   EXPECT_EQ("0", property("debug.sf.dump"));
   EXPECT_TRUE(exists("/data/corvex/.nomedia"));
+  EXPECT_EQ(owners_work(), is_systems("/data/corvex/.nomedia"));
   EXPECT_TRUE(log.has("corvexd: open file failure. /data/system/dropbox/m"))
       << "a move is taken for dropbox's, whatever directory it came into";
 
