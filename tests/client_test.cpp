@@ -64,6 +64,9 @@ double processor_time() {
 }
 
 TEST_F(Client, WaitsItsTurnAndTheRunAtNoProcessorTime) {
+  double before = processor_time();
+  EXPECT_EQ(0, call(" --list"));
+  const double start = processor_time() - before;
   std::vector<int> queue;
   while (queue.empty() || queue.back() != -1) {
     queue.push_back(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
@@ -84,9 +87,9 @@ TEST_F(Client, WaitsItsTurnAndTheRunAtNoProcessorTime) {
     usleep(500'000);
     close(connection);
   });
-  const double before = processor_time();
+  before = processor_time();
   EXPECT_EQ(0, call(" LOGSTOP")) << err_;
-  EXPECT_LT(processor_time() - before, 0.5);
+  EXPECT_LT(processor_time() - before, 2 * start + 0.1);
   shutdown(listener_, SHUT_RDWR);
   peer.join();
   EXPECT_EQ(message("LOGSTOP"), received);

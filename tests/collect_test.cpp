@@ -435,20 +435,29 @@ TEST_F(Collect, ADumpThatIsKilledIsReported) {
 }
 
 TEST_F(Collect, TagsFollowTheirSwitchesAndCommands) {
-  set_property("persist.oem.gps.debug", "2");
-  set_property("persist.oem.bt.debug", "1");
-  Daemon daemon(log);
   auto of_tags = [&](const std::string& value) {
     auto all = service.requests();
     return std::count_if(all.begin(), all.end(), [&](const auto& request) {
       return request.first.rfind("log.tag.", 0) == 0 && request.second == value;
     });
   };
-  EXPECT_TRUE(eventually([&] { return of_tags("INFO") == 8 * 64; }));
-  EXPECT_TRUE(eventually([&] { return of_tags("VERBOSE") == 8 * 24; }));
-  EXPECT_EQ("1", property("persist.oem.nfc.debug"));
-  EXPECT_EQ("VERBOSE", property("log.tag.NFC"));
-  EXPECT_TRUE(eventually([] { return pauses(2) == 8; }));
+  // Eight passes each, NFC at VERBOSE.
+  const char* switches[][2] = {{"2", "1"}, {"1", "2"}};
+  for (const auto& [gps, bluetooth] : switches) {
+    set_property("persist.oem.gps.debug", gps);
+    set_property("persist.oem.bt.debug", bluetooth);
+    const auto info = of_tags("INFO"), verbose = of_tags("VERBOSE");
+    const size_t passes = pauses(2);
+    Daemon daemon(log);
+    EXPECT_TRUE(eventually([&] { return pauses(2) == passes + 8; }));
+    EXPECT_EQ(8 * (*gps == '1' ? 12 : 64), of_tags("INFO") - info) << gps << bluetooth;
+    EXPECT_EQ(8 * (*gps == '1' ? 76 : 24), of_tags("VERBOSE") - verbose) << gps << bluetooth;
+    EXPECT_EQ("1", property("persist.oem.nfc.debug"));
+    EXPECT_EQ("VERBOSE", property("log.tag.NFC"));
+  }
+  const size_t passes = pauses(2);
+  Daemon daemon(log);
+  EXPECT_TRUE(eventually([&] { return pauses(2) == passes + 8; }));
   struct {
     const char* command;
     const char* tag;  // one of them
