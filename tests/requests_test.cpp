@@ -4,7 +4,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <functional>
 
 #include "tests/daemon.h"
 #include "tests/device_root.h"
