@@ -35,7 +35,7 @@ constexpr struct {
     {"inotify_add_watch", ""},  // a directory that is not there is not watched
     {"read", "copy_file"},      // what can be copied is
     {"write", "copy_file"},
-    {"clone", "file_observer"},   // a trace without its dump is better than none
+    {"clone", "start_child"},     // whose child cannot be started is missing
     {"", "open_program_output"},  // told on standard error, where a shell would tell it
 };
 
