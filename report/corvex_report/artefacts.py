@@ -29,6 +29,8 @@ LOGS = ("boot_log", "log_before_initial", "recovery", "kmsg")  # their lines hav
 # Copied when the capture begins, or later: the times of their files are those of the copies.
 COPIED = (EARLIER, *(title for name, title in KINDS if name in LOGS))
 DESCRIBED = 4096  # bytes
+# What a kernel may have nothing to say in, beside each ANR.
+BINDER_STATE = ("transactions", "transaction_log", "state")
 MARKERS = ("fileAfter911", "fileBefore911")
 OWN = ("getprop.txt", "versionNumber")
 

@@ -5,6 +5,7 @@ from dataclasses import dataclass, field
 from .artefacts import Kind
 from .clock import Clock
 from .files import Entry
+from .line_formats import Calendar
 from .recorders import Recorder
 from .thermal import Record
 from .tracks import Step, Track
@@ -35,6 +36,12 @@ class Series:
         return sum(file.entry.size for file in self.files)
 
     @property
+    def dated(self) -> bool:
+        """Whether it bears the time of day."""
+        tracks = [file.track for file in self.files if file.track]
+        return bool(tracks) and not self.recorder.once and not tracks[0].format.relative
+
+    @property
     def sampled(self) -> bool:
         return any(file.track is not None and file.track.sampled for file in self.files)
 
@@ -62,6 +69,7 @@ class Capture:
     version: bytes | None  # the file versionNumber
     kernel_version: str
     clock: Clock
+    calendar: Calendar
     series: list[Series]
     kinds: list[Kind]
     records: list[Record]

@@ -2,9 +2,11 @@
 
 from dataclasses import dataclass
 
+from .incidents import Incident
 from .scales import Tick, TimeScale, ValueScale, value_scale
 from .text import clock_text
 from .thermal import Record, Source
+from .timeline import MARKS, kind_title
 
 COLUMNS = 240  # of a chart in which the least and the greatest value are kept
 STEADY = 2.0  # degrees within which a zone is steady
@@ -35,9 +37,10 @@ class Chart:
     samples: int
     begun: str
     period: str
+    incidents: list[Tick]
 
 
-def chart(record: Record, begun: float | None) -> Chart | None:
+def chart(record: Record, begun: float | None, incidents: list[Incident]) -> Chart | None:
     times = record.times
     if not times or max(times) == min(times):
         return None
@@ -62,6 +65,12 @@ def chart(record: Record, begun: float | None) -> Chart | None:
         samples=len(times),
         begun=clock_text(times[0], begun),
         period=clock_text(times[-1], begun),
+        incidents=[
+            Tick(time.at(at), f"{kind_title(one.kind)}, {clock_text(at, begun)}")
+            for one in incidents
+            for at in one.times[:MARKS]
+            if time.first <= at <= time.last
+        ],
     )
 
 

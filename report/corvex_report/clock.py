@@ -11,13 +11,14 @@ from zoneinfo import ZoneInfo
 
 from .files import Entry
 from .line_formats import DAY
+from .records import Record
 from .text import EARLIEST, LATEST
 from .tracks import Step, Track
 
 QUARTER = 900  # seconds; every zone is off by a multiple of it
 AT_ONCE = 5.0  # seconds within which a line is written after the time that it bears
-ENOUGH = 2  # logs that agree; one alone may do so by chance
 WIDEST = 14 * 3600
+SET = 40 * 365 * DAY  # a clock that is behind it has not been set
 
 # Lines in which a kernel tells the time of day beside its own.
 KERNEL_TIME = re.compile(
@@ -45,6 +46,12 @@ class Clock:
         if track.format.relative:
             return None if self.boot is None else self.from_utc(self.boot + value)
         return self.from_utc(value) if track.format.utc else value
+
+    def of_record(self, record: Record, boot: float | None) -> float | None:
+        """The time of a line, in a log of the start of the device at `boot`."""
+        if not record.relative:
+            return record.time
+        return None if boot is None else self.from_utc(boot + record.time)
 
     def steps(self, track: Track) -> list[Step]:
         """A track's steps in local time."""
@@ -88,7 +95,7 @@ def find_clock(
     dated = [(e, t, last) for e, t, last in ended if not t.format.relative and not t.format.utc]
     clock = _named_zone(zone, near) or _offset(ended, dated, near)
     agree = sum(abs(last - clock.from_utc(e.mtime)) <= AT_ONCE for e, _, last in dated)
-    clock = replace(clock, file_times=agree >= min(ENOUGH, len(dated)))
+    clock = replace(clock, file_times=agree > 0 or not dated)
     return _with_boot(clock, [one for one in ended if one[1].format.relative], kernel, near)
 
 
@@ -101,14 +108,14 @@ def _named_zone(name: str, near: float) -> Clock | None:
 
 
 def _offset(ended: Dated, dated: Dated, near: float) -> Clock:
-    votes: Counter[float] = Counter()
-    for entry, _, last in dated:
-        ahead = last - entry.mtime
-        offset = _nearest_zone(ahead)
-        if abs(ahead - offset) <= AT_ONCE and abs(offset) <= WIDEST:
-            votes[offset] += 1
-    if votes and votes.most_common(1)[0][1] >= min(ENOUGH, len(dated)):
-        offset = votes.most_common(1)[0][0]
+    aheads = [last - entry.mtime for entry, _, last in dated]
+    offsets = [
+        offset
+        for ahead in aheads  # of a log that nobody has written for a while it says nothing
+        if abs(ahead - (offset := _nearest_zone(ahead))) <= AT_ONCE and abs(offset) <= WIDEST
+    ]
+    if offsets:
+        offset = Counter(offsets).most_common(1)[0][0]
         return Clock(offset, "the logs’ last lines against the times of their files")
     packets = [last for _, track, last in ended if track.format.utc]
     if packets and dated:
@@ -153,6 +160,13 @@ def _with_boot(clock: Clock, counted: Dated, kernel: bytes, near: float) -> Cloc
     entry, _, last = max(counted, key=lambda one: one[0].mtime)
     source = f"the last line of {entry.name} against the time of the file"
     return replace(clock, boot=entry.mtime - last, boot_source=source)
+
+
+def told_boot(line: bytes) -> float | None:
+    """By one line of a kernel's log. Before the clock is set a kernel tells of 1970."""
+    match = KERNEL_TIME.match(line)
+    boot = _told_boot(match) if match else None
+    return boot if boot is not None and boot > SET else None
 
 
 def _told_boot(match: "re.Match[bytes]") -> float | None:

@@ -1,9 +1,15 @@
 """The files of a log directory. It may hold anything: nothing is followed, nothing can block."""
 
+import errno
 import os
 import re
 import stat
+import zlib
 from dataclasses import dataclass
+
+
+UNPACKED = 4 * 1024 * 1024  # bytes that are taken from a packed file
+GZIP = 31  # zlib's name for it
 
 
 @dataclass(frozen=True)
@@ -73,8 +79,33 @@ class Reader:
     def __exit__(self, *_: object) -> None:
         os.close(self._fd)
 
+    def fileno(self) -> int:
+        return self._fd
+
     def read(self, offset: int, length: int) -> bytes:
         return os.pread(self._fd, length, offset)
+
+
+class Unpacked(Reader):
+    """Reads the beginning of what a packed file holds."""
+
+    def __init__(self, directory: str, entry: Entry) -> None:
+        with Reader(directory, entry) as packed:
+            data = packed.read(0, UNPACKED)
+        try:
+            text = zlib.decompressobj(GZIP).decompress(data, UNPACKED)
+        except zlib.error as error:
+            raise OSError(errno.EIO, "it cannot be unpacked") from error
+        self._fd = os.memfd_create("unpacked", os.MFD_CLOEXEC)
+        with open(os.dup(self._fd), "wb") as file:
+            file.write(text)
+        os.lseek(self._fd, 0, os.SEEK_SET)
+        self.size, self.mtime = len(text), entry.mtime
+
+
+def open_text(directory: str, entry: Entry) -> Reader:
+    """Raises OSError."""
+    return (Unpacked if entry.name.endswith(".gz") else Reader)(directory, entry)
 
 
 def read_piece(directory: str, entry: Entry, length: int, at_end: bool = False) -> bytes:

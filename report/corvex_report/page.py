@@ -5,12 +5,12 @@ from pathlib import Path
 
 from jinja2 import Environment, FileSystemLoader, StrictUndefined
 
-from . import charts, timeline
+from . import charts, timeline, wrong
 from .artefacts import OTHER
 from .capture import Capture, LogFile
-from .findings import findings
+from .findings import Finding, findings, nothing_on
+from .incidents import Incident
 from .properties import groups, version_text
-from .sleep import Sleep
 from .text import clock_text, counted, date_time, duration_text, shown, size_text, span_text
 
 TEMPLATES = Path(__file__).parent / "templates"
@@ -23,39 +23,62 @@ class FileRow:
     path: str
     size: int
     when: str
+    id: str
 
 
-def render(capture: Capture) -> str:
-    sleep = Sleep(capture)
-    environment = Environment(
+def environment() -> Environment:
+    made = Environment(
         loader=FileSystemLoader(TEMPLATES),
         autoescape=True,
         trim_blocks=True,
         lstrip_blocks=True,
         undefined=StrictUndefined,
     )
-    environment.filters.update(
-        shown=shown, size=size_text, counted=counted, clock=lambda t: clock_text(t, capture.begun)
-    )
-    page = environment.get_template("page.html").render(
-        capture=capture,
-        facts=_facts(capture),
-        findings=findings(capture, sleep),
-        sleep=sleep.remark(),
-        timeline=timeline.build(capture),
-        when=lambda item: timeline.item_when(item, capture.begun),
-        charts=[(record, charts.chart(record, capture.begun)) for record in capture.records],
-        groups=groups(capture.properties, capture.kernel_version),
-        files=_files(capture),
-        more_files=max(0, len(capture.entries) - LISTED),
-        sampled=[file.entry.path for s in capture.series for file in s.files if _sampled(file)],
-        boot=_boot(capture),
-        at_once=AT_ONCE,
-        listed=LISTED,
-        other=OTHER,
+    made.filters.update(shown=shown, size=size_text, counted=counted)
+    return made
+
+
+def render(capture: Capture, incidents: list[Incident], output: str) -> str:
+    line = timeline.build(capture, incidents)
+    page = (
+        environment()
+        .get_template("page.html")
+        .render(
+            capture=capture,
+            facts=_facts(capture),
+            nothing_on=nothing_on(capture),
+            wrong=wrong.views(capture, incidents, output),
+            wrong_count=len(incidents),
+            wrong_more=max(0, len(incidents) - wrong.SHOWN),
+            findings=_leading(capture, findings(capture), line),
+            timeline=line,
+            when=lambda item: timeline.item_when(item, capture.begun),
+            charts=[
+                (record, charts.chart(record, capture.begun, incidents))
+                for record in capture.records
+            ],
+            groups=groups(capture.properties, capture.kernel_version),
+            files=_files(capture),
+            more_files=max(0, len(capture.entries) - LISTED),
+            sampled=[file.entry.path for s in capture.series for file in s.files if _sampled(file)],
+            boot=_boot(capture),
+            at_once=AT_ONCE,
+            listed=LISTED,
+            other=OTHER,
+        )
     )
     # A name may hold a byte that is no text; it has been escaped where it is shown.
     return page.encode("utf-8", "backslashreplace").decode()
+
+
+def _leading(
+    capture: Capture, found: list[Finding], line: timeline.Timeline | None
+) -> list[tuple[str, str]]:
+    """Each finding with the row that it is about."""
+    rows = {entry.path: f"file-{i}" for i, entry in enumerate(capture.entries[:LISTED])}
+    if line:
+        rows |= {row.name: row.id for row in line.recorded}
+    return [(finding.text, rows.get(finding.about, "files")) for finding in found]
 
 
 def _facts(capture: Capture) -> list[tuple[str, str]]:
@@ -103,6 +126,6 @@ def _files(capture: Capture) -> list[FileRow]:
         for item in kind.items:
             times |= {entry.path: timeline.item_when(item, capture.begun) for entry in item.entries}
     return [
-        FileRow(shown(entry.path), entry.size, times.get(entry.path, ""))
-        for entry in capture.entries[:LISTED]
+        FileRow(shown(entry.path), entry.size, times.get(entry.path, ""), f"file-{number}")
+        for number, entry in enumerate(capture.entries[:LISTED])
     ]

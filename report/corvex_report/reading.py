@@ -11,7 +11,7 @@ from .files import Entry, Reader, read_piece, scan
 from .line_formats import DAY, Calendar
 from .properties import parse_properties
 from .recorders import RECORDERS, Recorder, missing_names, rotated_files
-from .tracks import Step, last_line_problem, notable, read_track, steps_between
+from .tracks import Step, notable, read_track, steps_between
 
 NAME = re.compile(r".+_(?P<number>\d{1,9})--(?P<time>[\d-]{19})(_current)?")
 MARK = "_current"
@@ -85,6 +85,7 @@ class _Reading:
             version=self._head("versionNumber", VERSION_FILE),
             kernel_version=self._kernel_version(),
             clock=clock,
+            calendar=self._calendar,
             series=series,
             kinds=artefacts.collect(self._directory, others, tracks, clock),
             records=records,
@@ -102,8 +103,7 @@ class _Reading:
             return log
         try:
             with Reader(self._directory, entry) as reader:
-                log.track = read_track(reader, self._calendar)
-                log.ending = last_line_problem(reader, log.track)
+                log.track, log.ending = read_track(reader, self._calendar)
         except OSError as error:
             self._unreadable.append((entry.path, f"cannot be read: {error.strerror}"))
         return log
@@ -114,7 +114,7 @@ class _Reading:
         known = bool(self._properties)
         logs = [self._log(files[number]) for number in sorted(files, reverse=not recorder.ring)]
         if recorder.ring:
-            logs.sort(key=lambda log: log.track.first if log.track else 0.0)
+            logs.sort(key=lambda log: log.track.first if log.track else log.entry.mtime)
         switched_on = "yes" in values if known else None
         return Series(recorder, switched_on, logs, missing_names(recorder, files))
 
@@ -153,8 +153,11 @@ def _top(entry: Entry) -> str:
 
 def _place_in_time(series: Series, clock: Clock) -> None:
     before: float | None = None
+    holds_packets = series.recorder.ring and any(file.track for file in series.files)
     for file in series.files:
         track = file.track
+        if holds_packets and track is None:
+            continue  # it says nothing of when the others were written
         if track:
             file.first = clock.local(track, track.first)
             file.last = None if track.last is None else clock.local(track, track.last)

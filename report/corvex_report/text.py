@@ -61,3 +61,8 @@ def span_text(first: float, last: float, near: float | None) -> str:
 
 def counted(count: int, one: str, many: str = "") -> str:
     return f"{count} {one if count == 1 else many or one + 's'}"
+
+
+def plain(text: str) -> str:
+    """Valid UTF-8, whatever bytes a device had."""
+    return text.encode("utf-8", "surrogateescape").decode("utf-8", "replace")

@@ -5,6 +5,7 @@ from dataclasses import dataclass, field
 
 from .artefacts import OTHER, Item, Kind
 from .capture import Capture, Series
+from .incidents import Incident
 from .scales import TimeScale, time_scale
 from .text import clock_text, counted, shown, size_text, span_text
 from .thermal import Record
@@ -35,20 +36,23 @@ class Row:
     marks: list[Bar] = field(default_factory=list)
     earlier: bool = False  # begins before what the scale shows
     later: bool = False
+    id: str = ""
 
 
 @dataclass(frozen=True)
 class Timeline:
     scale: TimeScale
     begun: float | None  # percent
+    wrong: list[Row]
     recorded: list[Row]
     collected: list[Row]
 
 
-def build(capture: Capture) -> Timeline | None:
+def build(capture: Capture, incidents: list[Incident]) -> Timeline | None:
     times = [time for series in capture.series for time in (series.first, series.last) if time]
     times += [item.first for kind in capture.kinds for item in kind.items if item.first]
     times += [time for record in capture.records for time in record.times[-1:]]
+    times += [time for incident in incidents for time in incident.times]
     if not times:
         return None
     if capture.begun is not None:
@@ -64,8 +68,10 @@ def build(capture: Capture) -> Timeline | None:
     recorded = [_series_row(capture, s, scale) for s in capture.series if s.files]
     recorded += [_record_row(capture, record, scale) for record in capture.records]
     collected = [_kind_row(capture, k, scale) for k in capture.kinds if k.title != OTHER]
+    for number, row in enumerate(recorded):
+        row.id = f"row-{number}"
     at = None if capture.begun is None else scale.at(capture.begun)
-    return Timeline(scale, at, recorded, collected)
+    return Timeline(scale, at, _wrong_rows(capture, incidents, scale), recorded, collected)
 
 
 def _bar(row: Row, scale: TimeScale, first: float, last: float, title: str) -> None:
@@ -75,6 +81,23 @@ def _bar(row: Row, scale: TimeScale, first: float, last: float, title: str) -> N
         return
     left = scale.at(first)
     row.bars.append(Bar(left, max(0.0, scale.at(last) - left), title))
+
+
+def _wrong_rows(capture: Capture, incidents: list[Incident], scale: TimeScale) -> list[Row]:
+    """A row for each kind of incident, with a mark for each occurrence."""
+    rows: dict[str, Row] = {}
+    for incident in incidents:
+        row = rows.setdefault(incident.kind, Row(kind_title(incident.kind), "Incidents", 0, 0))
+        row.files += incident.count
+        for time in incident.times:
+            if len(row.marks) < MARKS:
+                what = shown(incident.process or incident.reason)[:80]
+                _mark(row, scale, time, f"{what}: {clock_text(time, capture.begun)}")
+    return list(rows.values())
+
+
+def kind_title(kind: str) -> str:
+    return "ANR" if kind == "anr" else kind.replace("-", " ").capitalize()
 
 
 def _series_row(capture: Capture, series: Series, scale: TimeScale) -> Row:

@@ -1,13 +1,13 @@
 """What the times in one file say: from when to when, where it is silent, where the clock steps.
 
-A small file is read whole. Of a large one the head, the tail and a few places between are read, and
+A small log and most packet files are read whole. Of a large log the head, the tail and a few places between are read, and
 where the most time passes between two of those, it is looked at more closely."""
 
 from dataclasses import dataclass, field
 
 from .files import Reader
 from .line_formats import LINE_FORMATS, Calendar, LineFormat
-from .pcap import PcapFormat, pcap_format
+from .pcap import WALKED, PcapFormat, pcap_format
 
 WHOLE = 512 * 1024  # bytes
 HEAD = 65536
@@ -45,27 +45,39 @@ def steps_between(times: list[float]) -> list[Step]:
     return [step for step in steps if notable(step)]
 
 
-def find_format(head: bytes, calendar: Calendar, written: float) -> Format | None:
-    packets = pcap_format(head, written)
-    if packets:
-        return packets
+def find_line_format(head: bytes, calendar: Calendar) -> LineFormat | None:
     counts = [(len(line.times(head, calendar, True)), line) for line in LINE_FORMATS]
     count, best = max(counts, key=lambda pair: pair[0])
     return best if count else None
 
 
-def read_track(reader: Reader, calendar: Calendar) -> Track | None:
+def read_track(reader: Reader, calendar: Calendar) -> tuple[Track | None, str]:
+    """With what is wrong with the end of the file, as a half sentence; usually nothing."""
     head = reader.read(0, HEAD)
-    found = find_format(head, calendar, reader.mtime)
-    if found is None:
-        return None
-    if reader.size <= max(WHOLE, found.block):
+    packets = pcap_format(head)
+    if packets:
+        return _packets(reader, packets)
+    track, found = None, find_line_format(head, calendar)
+    if found and reader.size > WHOLE:
+        track = _sample(reader, found, calendar)
+    elif found:
         times = found.times(reader.read(0, reader.size), calendar, True)
-        return Track(found, times[0], times[-1], steps_between(times)) if times else None
-    return _sample(reader, found, calendar)
+        track = Track(found, times[0], times[-1], steps_between(times)) if times else None
+    return track, _last_line_problem(reader)
 
 
-def _sample(reader: Reader, found: Format, calendar: Calendar) -> Track | None:
+def _packets(reader: Reader, found: PcapFormat) -> tuple[Track | None, str]:
+    whole = reader.size <= WALKED
+    times, cut = found.walk(reader.read(0, reader.size if whole else WHOLE))
+    if not times:
+        return None, ""
+    if not whole:
+        return Track(found, times[0], None, sampled=True), ""
+    ending = f"ends {cut} bytes into a packet that is not whole" if cut else ""
+    return Track(found, times[0], times[-1], steps_between(times)), ending
+
+
+def _sample(reader: Reader, found: LineFormat, calendar: Calendar) -> Track | None:
     def times_at(offset: int, length: int) -> list[float]:
         return found.times(reader.read(offset, length), calendar, offset == 0)
 
@@ -89,12 +101,7 @@ def _sample(reader: Reader, found: Format, calendar: Calendar) -> Track | None:
     return track
 
 
-def last_line_problem(reader: Reader, track: Track | None) -> str:
-    """What is wrong with the end of a file, as a half sentence; usually nothing."""
-    if track and isinstance(track.format, PcapFormat):
-        start = max(0, reader.size - track.format.block)
-        cut = track.format.cut_off(reader.read(start, track.format.block), start == 0)
-        return f"ends {cut} bytes into a packet that is not whole" if cut else ""
+def _last_line_problem(reader: Reader) -> str:
     tail = reader.read(max(0, reader.size - HEAD), HEAD)
     zeros = len(tail) - len(tail.rstrip(b"\0"))
     if zeros:

@@ -1,5 +1,6 @@
 """What the report says of captures that are healthy, odd, hostile and large."""
 
+import gzip
 import os
 import random
 import shutil
@@ -55,7 +56,8 @@ class HealthyTest(ReportTest):
         for empty in ("dropbox/a@1.txt.lost", "anr/a@1.txt.lost", "anr/2026-11-23-00-35-52/state"):
             put(self.capture / empty, b"", BEGUN)
         for early in ("traces.txt", f"data_app_anr@{int(BEGUN - 7260)}000.txt.gz"):
-            put(self.capture / "anr" / early, b"text", BEGUN + 5)
+            text = gzip.compress(b"text") if early.endswith(".gz") else b"text"
+            put(self.capture / "anr" / early, text, BEGUN + 5)
         unset = b"6,9,9000,-;rtc: setting system clock to 1970-01-01 00:00:07 UTC (7)\n"
         put(self.capture / "kernel.log", unset + kernel(END), END)
         put(self.capture / "kmsg/last_kmsg", b"[ 99999.0] other start\n", END + 5)
@@ -132,7 +134,6 @@ class HealthyTest(ReportTest):
         }
         page = self.bare(BEGUN, end, files)
         self.assertEqual(page.odd, [])
-        self.assert_says(page, "silent together 27 times for more than 5 min, the longest 19 min")
         files |= {"android.log": written(lines, (5, 9)), "kv_tsen_data/x": written(samples, (7,))}
         times = "for more than 5 min, the longest 39 min from 01:52:30 to 02:31:30"
         odd = [
@@ -296,7 +297,7 @@ class LargeTest(ReportTest):
         ]
         self.assertEqual(page.odd, odd)
         self.assertEqual(page.row("event.log")[1], "00:31:30 – 00:41:30")
-        self.assert_says(page, "3 large files were read in part")
+        self.assert_says(page, "2 large files were read in part")
         lines = packets(BEGUN, BEGUN + 8 * DAY, 300, 900)
         page = self.bare(BEGUN, BEGUN + 8 * DAY, {"tcpdump0": lines})
         self.assertEqual(page.odd, [])

@@ -1,0 +1,76 @@
+"""Where something happened: the first frame of a stack that is not the machinery of dying."""
+
+import re
+from collections.abc import Iterable
+
+# What stands between a fault and the frame that is to blame for it.
+NATIVE_MACHINERY = re.compile(
+    r"abort|raise|tgkill|tkill|pthread_kill|syscall|gsignal|__(libc_)?fatal\w*|__assert\w*|__android_log_assert"
+    r"|__stack_chk_fail|__fortify\w*|__cxa_\w+|__cfi_\w+|android::base::(DefaultAborter|LogMessage::~LogMessage)\b.*"
+    r"|art::Runtime::Abort\b.*|std::(__\w+::)?(terminate|__terminate)\b.*|_Unwind_\w+|inlined_?abort"
+)
+KERNEL_MACHINERY = re.compile(
+    r"panic|nmi_panic|dump_backtrace|show_stack|dump_stack|show_regs|die\w*|oops_\w+|bug_handler|brk_handler"
+    r"|__do_kernel_fault\w*|do_\w+_(fault|abort)|do_debug_exception|el[01]_\w+|(__)?schedule|schedule_\w+"
+    r"|io_schedule\w*|__switch_to|watchdog_timer_fn|hrtimer_interrupt|__hrtimer_\w+|__warn|warn_slowpath_\w+"
+    r"|report_bug|trigger_\w+|rcu_\w+|print_\w+stall\w*|check_hung_\w+|watchdog"
+)
+NATIVE = re.compile(r"\s*#\d+ +pc +([0-9a-fA-F]+) +(\S+)(?: \((.+)\))?")
+JAVA = re.compile(r"\s*at ([\w.$<>/\-]+\([^)\n]{0,200}\))")
+EXCEPTION = re.compile(r"(?:Caused by: )?((?:[\w$]+\.)+[\w$]+)(?:: (.*))?$")
+PROGRAM_COUNTER = re.compile(
+    r"(?:PC is at|pc :|RIP: [\w]+:|EIP is at) *(?:\[<\w+>\] )?([A-Za-z_][\w.$]*)\+0x"
+)
+KERNEL_FRAME = re.compile(
+    r" *(?:\[<[0-9a-fA-F]+>\] )?\(?(?:\? )?([A-Za-z_][\w.$]*)\+0x[0-9a-f]+/0x"
+)
+
+
+def native_place(lines: Iterable[str]) -> str | None:
+    """Of the first backtrace."""
+    first = None
+    before = -1
+    for line in lines:
+        match = NATIVE.match(line)
+        if not match:
+            continue
+        number = int(line.split("#")[1].split()[0])
+        if number <= before:  # the stack of another thread
+            break
+        before = number
+        symbol = match[3] or ""
+        if symbol.startswith("BuildId"):
+            symbol = ""
+        name = symbol.split(" (BuildId")[0]
+        offset = int(match[1], 16)
+        place = f"{match[2]} ({name})" if name else f"{match[2]}+0x{offset:x}"
+        first = first or place
+        if not NATIVE_MACHINERY.fullmatch(re.sub(r"(\(.*)?(\+\d+)?$", "", name) or "?"):
+            return place
+    return first
+
+
+def java_place(lines: Iterable[str]) -> tuple[str, str | None]:
+    """The root cause of an exception, and the first frame of its stack."""
+    reason, place = "", None
+    for line in lines:
+        exception = EXCEPTION.match(line)
+        if exception and (not reason or line.startswith("Caused by: ")):
+            reason = line.removeprefix("Caused by: ").strip()
+            place = None
+        elif reason and place is None and (frame := JAVA.match(line)):
+            place = frame[1]
+    return reason, place
+
+
+def kernel_place(lines: Iterable[str]) -> str | None:
+    """The program counter where one is told, and else the first frame of the call trace."""
+    first = None
+    for line in lines:
+        counter = PROGRAM_COUNTER.match(line)
+        if counter:
+            return counter[1]
+        frame = KERNEL_FRAME.match(line)
+        if frame and first is None and not KERNEL_MACHINERY.fullmatch(frame[1]):
+            first = frame[1]
+    return first
