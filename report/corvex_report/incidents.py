@@ -61,6 +61,15 @@ class Occurrence:
     def pid(self) -> int | None:
         return next((t.pid for t in self.tellings if t.pid is not None), None)
 
+    def may_be_of(self, telling: Telling) -> bool:
+        """Nothing that both know is another."""
+        process = next((t.process for t in self.tellings if t.process), None)
+        return (
+            telling.identity != ""
+            or (self.pid is None or telling.pid is None or self.pid == telling.pid)
+            and (process is None or telling.process is None or process == telling.process)
+        )
+
     def summary(self) -> tuple[str, str | None, str, str | None]:
         """Kind, process, reason and place, each from the source that says most."""
         kind = min((t.kind for t in self.tellings), key=lambda kind: RANKS[kind])
@@ -164,7 +173,7 @@ def _together(tellings: list[tuple[float, str, Telling]]) -> list[Occurrence]:
             begun, of, known = latest.get(key, (0.0, "", None))
             if known is None or of != clock or time - begun > WITHIN:
                 continue
-            if known.pid is None or telling.pid is None or known.pid == telling.pid:
+            if known.may_be_of(telling):
                 match = begun, clock, known
                 break
         if match is None:

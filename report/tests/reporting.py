@@ -1,5 +1,6 @@
 """Runs corvex-report, and reads its page as a person does: by what is written in it."""
 
+import json
 import os
 import shutil
 import subprocess
@@ -7,6 +8,7 @@ import tempfile
 import unittest
 from html.parser import HTMLParser
 from pathlib import Path
+from typing import Any
 
 from fixture import PROPERTIES, make_capture, put, put_properties, stamp
 
@@ -73,6 +75,11 @@ class ReportTest(unittest.TestCase):
         self.parent = self.directory / "pulled"
         self.capture = make_capture(self.parent)
 
+    def calm(self) -> None:
+        """Leaves nothing that tells of an incident."""
+        for folder in ("tombstones", "dropbox", "anr"):
+            shutil.rmtree(self.capture / folder)
+
     def assert_says(self, page: Page, *texts: str) -> None:
         for text in texts:
             self.assertTrue(text in page.text, f"the page does not say: {text}")
@@ -83,6 +90,13 @@ class ReportTest(unittest.TestCase):
         done = run(self.capture, "-o", output)
         self.assertEqual((done.returncode, done.stderr), (0, ""), done.stderr)
         return Page(output.read_text("utf-8"))
+
+    def incidents(self) -> list[dict[str, Any]]:
+        """What the capture is said to tell of, by --json."""
+        done = run("--json", self.capture)
+        self.assertEqual((done.returncode, done.stderr), (0, ""), done.stderr)
+        found: list[dict[str, Any]] = json.loads(done.stdout)["incidents"]
+        return found
 
     def bare(self, begun: float, end: float, files: dict[str, bytes]) -> Page:
         """Of a capture of nothing but some files, each written until its end."""
