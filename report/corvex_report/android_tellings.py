@@ -36,13 +36,15 @@ Match = re.Match[str]
 
 
 def _fatal_signal(mention: Mention, match: Match) -> Telling:
-    thread_is_process = match[4] is not None and int(match[4]) == mention.record.pid
+    main = match[5] if match[4] and int(match[4]) == mention.record.pid else None
+    thread = match[7] or main
     return mention.telling(
         "native-crash",
         6,
         pid=int(match[6]) if match[6] else mention.record.pid,
         reason=signal_reason(match[1], match[2], match[3]),
-        process=SYSTEM if SYSTEM in (match[7], thread_is_process and match[5]) else None,
+        process=SYSTEM if thread == SYSTEM else None,
+        thread=thread,
     )
 
 

@@ -22,7 +22,6 @@ RANKS = {
 # Kinds of which one may be a part of another.
 FAMILIES = {"kernel-oops": "kernel-panic"}
 SYSTEM = "system_server"
-NUMBERED = "pid "
 WITHIN = 10.0  # seconds within which the same process has come to grief once
 NUMBERS = re.compile(r"0[xX][0-9a-fA-F]+|\b[0-9a-fA-F]{7,16}\b|\d+")
 
@@ -39,6 +38,7 @@ class Telling:
     where: str | None = None
     rank: int = 0  # of the source; the lowest says most
     identity: str = ""  # of what is no process
+    thread: str | None = None  # what the process is called by who does not know its name
     uptime: float | None = None  # where there is no time of day
     offset: int = 0  # of the line
 
@@ -80,8 +80,7 @@ class Occurrence:
         oops = next((t for t in ranked if t.kind == "kernel-oops"), None)
         if oops and kind == "kernel-panic":
             reason, where = f"{reason} ({oops.reason})", oops.where or where
-        if process is None and (pid := self.pid) is not None:
-            process = f"{NUMBERED}{pid}"
+        process = process or next((t.thread for t in ranked if t.thread), None)
         return kind, process, reason or next((t.reason for t in ranked if t.reason), ""), where
 
     @property
@@ -131,10 +130,8 @@ def set_aside(reason: str) -> str:
 
 
 def key(incident: Incident) -> tuple[str, str | None, str, str | None]:
-    """The same of incidents that are alike; a number is no name of a process."""
-    name = incident.process
-    known = None if name and name.startswith(NUMBERED) else name
-    return incident.kind, known, set_aside(incident.reason), incident.where
+    """The same of incidents that are alike."""
+    return incident.kind, incident.process, set_aside(incident.reason), incident.where
 
 
 def incidents(tellings: Iterable[Telling]) -> list[Incident]:

@@ -6,8 +6,9 @@ import unittest
 from pathlib import Path
 from typing import Any, ClassVar
 
-from fixture import BEGUN, LENGTH, RING, logcat, packets, put, sample, spread
+from fixture import BEGUN, RING, packets, put
 from reporting import ReportTest
+from trouble import trouble
 
 try:
     from browser import Browser
@@ -70,16 +71,9 @@ class PageTest(ReportTest):
 
     def spoil(self) -> None:
         """A capture with something to tell."""
-        end = BEGUN + LENGTH
-        put(self.capture / "android.log.01", logcat(BEGUN + 200, BEGUN + 255, 0.25, "init"), end)
-        put(self.capture / "android.log", logcat(BEGUN + 580, end, 0.25, "init"), end)
+        trouble(self.capture)
         put(self.capture / RING[2], packets(BEGUN + 430, BEGUN + 595, 0.3)[:-40], BEGUN + 595)
-        (self.capture / "event.log").unlink()
-        record = [
-            sample(t, ("pa_therm0",) if i % 9 == 5 else ())
-            for i, t in enumerate(spread(BEGUN, end, 3))
-        ]
-        put(self.capture / "kv_tsen_data/20261123_03140", "".join(record).encode(), end)
+        (self.capture / "radio.log").unlink()
         (self.parent / "KVBR_1--2026-11-22-22-04-11_current").mkdir()
         put(self.capture / "dropbox" / ("long_" * 40), b"x", BEGUN + 9)
 
@@ -118,10 +112,14 @@ class PageTest(ReportTest):
         put(path, b"Cmd line: " + b"m" * 99, BEGUN)
         for number in range(30):
             put(self.capture / "dropbox" / f"tag_{number}@1795386830{number:03}.txt", b"x", BEGUN)
+        self.spoil()
         page = self.page()
         for width in WIDTHS:
             self.browser.open(page, width)
             self.browser.run("document.querySelectorAll('details').forEach(d => d.open = true)")
+            anchors = "[...document.querySelectorAll('a[href^=\"#\"]')].map(a => a.hash.slice(1))"
+            lost = f"return {anchors}.filter(id => !document.getElementById(id))"
+            self.assertEqual(self.browser.run(lost), [])
             self.assertEqual(self.browser.run("return document.documentElement.scrollWidth"), width)
             self.assertEqual(self.browser.complaints(), [])
             loaded = "return document.querySelectorAll('[onload]').length"

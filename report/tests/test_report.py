@@ -3,13 +3,26 @@
 import gzip
 import os
 import random
+import resource
 import shutil
 import time
 import unittest
+import zlib
 from collections.abc import Callable
 from pathlib import Path
 
-from fixture import BEGUN, LENGTH, PROPERTIES, logcat, packets, put, put_properties, sample, stamp
+from fixture import (
+    AHEAD,
+    BEGUN,
+    LENGTH,
+    PROPERTIES,
+    logcat,
+    packets,
+    put,
+    put_properties,
+    sample,
+    stamp,
+)
 from fixture import RING, kernel, spread
 from reporting import Page, ReportTest, run
 
@@ -87,6 +100,17 @@ class HealthyTest(ReportTest):
         page = self.report()
         self.assert_says(page, "persist.sys.timezone is Europe/Helsinki")
         self.assertEqual(page.row("kernel.log")[1], "11-22 23:08:10 – 00:41:30")
+
+    def test_a_stale_log_and_a_piece_without_packets(self) -> None:
+        """Neither says anything of when it is, or how far ahead of UTC."""
+        os.utime(self.capture / "radio.log", (END - AHEAD - 361,) * 2)
+        (self.capture / "event.log").unlink()
+        for old in self.capture.glob("android.log.0?"):
+            old.unlink()
+        put(self.capture / "tcpdump1", packets(0, -1, 1), BEGUN - DAY)
+        page = self.report()
+        self.assert_says(page, "UTC+02:00 (the logs’ last lines against the times of their files)")
+        self.assertEqual(page.row("tcpdump")[1], "00:35:50 – 00:41:25")
 
     def test_new_year_and_summer_time(self) -> None:
         """Lines without a year belong to the years around the capture; an hour may come twice, or
@@ -261,9 +285,18 @@ class HostileTest(ReportTest):
         put(self.capture / "getprop.txt", b"[" + b"]: [" * 2**19, BEGUN)
         put(self.capture / "tcpdump0", packets(BEGUN, BEGUN + 9, 1) + noise.randbytes(2**24), END)
         put(self.capture / "tombstones/x", b">>> " * 2**20, END)
+        packer = zlib.compressobj(wbits=31)
+        bomb = b"".join(packer.compress(bytes(2**20)) for _ in range(1024)) + packer.flush()
+        for name in ("dropbox/data_app_crash@1.txt.gz", "dropbox/SYSTEM_LAST_KMSG@1.txt.gz"):
+            put(self.capture / name, bomb, END)
+        put(self.capture / "event.log", b"x am_crash: [" * 4 * 2**20, END)
+        os.mkfifo(self.capture / "anr/traces.txt")
         start = time.monotonic()
-        self.report()
-        self.assertLess(time.monotonic() - start, 10)
+        page = self.report()
+        self.assertIn("anr/traces.txt is no regular file and was not looked into.", page.odd)
+        self.assertLess(time.monotonic() - start, 20)
+        most = resource.getrusage(resource.RUSAGE_CHILDREN).ru_maxrss
+        self.assertLess(most, 200 * 1024)
 
     def test_any_bytes_in_any_file(self) -> None:
         noise = random.Random(8)

@@ -116,9 +116,10 @@ def quotes(time: float) -> bytes:
 
 
 def put_log(path: Path, *parts: bytes) -> None:
-    """Between lines of no interest, of a capture that goes on."""
-    begin, end = logcat(BEGUN - 20, BEGUN - 1, 1, "init"), logcat(END - 1, END, 1, "init")
-    put(path, begin + b"".join(parts) + end, END)
+    """Among lines of no interest, a second apart."""
+    log = logcat(BEGUN - 20, END, 1, "init") + b"".join(parts)
+    rows = sorted(log.splitlines(keepends=True), key=lambda row: row[:18])
+    put(path, b"".join(rows), END)
 
 
 def dropbox(tag: str, time: float) -> str:
