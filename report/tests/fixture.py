@@ -141,9 +141,10 @@ def put_artefacts(capture: Path) -> None:
     for index, (name, signal) in enumerate(signals):
         time = BEGUN + 140 + 210 * index
         path = capture / "tombstones" / stamp(time, "%Y-%m-%d-%H-%M-%S") / f"tombstone_0{index}"
-        put(path, crash.format(name, signal).encode(), time)
+        text = crash.format(name, signal).encode()
+        put(path, text, time)
         entry = f"data_app_crash@{int((time - AHEAD) * 1000)}.txt.gz"
-        put(capture / "dropbox" / entry, gzip.compress(crash.encode()), time)
+        put(capture / "dropbox" / entry, gzip.compress(text), time)
     time = BEGUN + 262
     name = stamp(time, "%Y-%m-%d-%H-%M-%S")
     put(

@@ -7,7 +7,7 @@ from pathlib import Path
 from typing import Any, ClassVar
 
 from fixture import BEGUN, RING, packets, put
-from reporting import ReportTest
+from reporting import ReportTest, run
 from trouble import trouble
 
 try:
@@ -124,6 +124,20 @@ class PageTest(ReportTest):
             self.assertEqual(self.browser.complaints(), [])
             loaded = "return document.querySelectorAll('[onload]').length"
             self.assertEqual(self.browser.run(loaded), 0)
+
+    def test_index(self) -> None:
+        trouble(self.capture)
+        shutil.copytree(self.capture, self.parent / "KVBR_1--2026-11-22-10-00-00")
+        index = self.directory / "index.html"
+        self.assertEqual(run(self.parent, "-o", index).returncode, 0)
+        for width in WIDTHS:
+            for dark in (False, True):
+                self.browser.open(index, width, dark)
+                self.assertEqual(self.browser.complaints(), [])
+                self.assertEqual(self.browser.requests(), [index.as_uri()])
+                whole = "return document.documentElement.scrollWidth"
+                self.assertEqual(self.browser.run(whole), width)
+                self.browser.save(PICTURES / f"index-{width}-{'dark' if dark else 'light'}.png")
 
     def test_picture_for_the_readme(self) -> None:
         self.spoil()
