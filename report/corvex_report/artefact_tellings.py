@@ -71,7 +71,7 @@ TAGS: tuple[tuple[str, str, Parse], ...] = (
     ("SYSTEM_TOMBSTONE", "native-crash", native_crash),
     ("_crash", "java-crash", java_crash),
     ("_anr", "anr", not_responding),
-    ("_watchdog", "system-restart", java_crash),
+    ("_watchdog", "system-restart", not_responding),
 )
 
 
@@ -86,13 +86,6 @@ def _dropped(tag: str, lines: list[str]) -> tuple[str, Crash | None]:
             crash.process = SYSTEM
             if kind == "anr":
                 return kind, crash
-            crash.reason = crash.reason or _subject(lines)
             return "system-restart", crash
         return kind, crash
     return "", None
-
-
-def _subject(lines: list[str]) -> str:
-    return next(
-        (t.removeprefix("Subject: ").strip() for t in lines if t.startswith("Subject: ")), ""
-    )

@@ -8,6 +8,7 @@ from .thermal import Record
 
 # Degrees beyond which a zone is too hot: those on the chip bear more than those on the board.
 LIMITS = (("tz_sensor", 95.0), ("pm", 95.0), ("", 70.0))
+LIMITS_TEXT = [(f"{names}*" if names else "others", f"{most:.0f}") for names, most in LIMITS]
 REASONS = ("sys.boot.reason", "ro.boot.bootreason", "ro.boot.boot_reason")
 ABNORMAL = re.compile(
     r"panic|oops|watchdog|wdog|wdt|dog_bi|bark|bite|thermal|temperature|overheat|crash|fault|error"

@@ -5,9 +5,9 @@ from collections.abc import Iterable
 
 # What stands between a fault and the frame that is to blame for it.
 NATIVE_MACHINERY = re.compile(
-    r"abort|raise|tgkill|tkill|pthread_kill|syscall|gsignal|__(libc_)?fatal\w*|__assert\w*|__android_log_assert"
+    r"_*(libc_)?(android_)?abort(_message)?|raise|tgkill|tkill|pthread_kill|syscall|gsignal|__(libc_)?fatal\w*|__assert\w*|__android_log_assert"
     r"|__stack_chk_fail|__fortify\w*|__cxa_\w+|__cfi_\w+|android::base::(DefaultAborter|LogMessage::~LogMessage)\b.*"
-    r"|art::Runtime::Abort\b.*|std::(__\w+::)?(terminate|__terminate)\b.*|_Unwind_\w+|inlined_?abort"
+    r"|art::Runtime::Abort\b.*|std::(__\w+::)?(terminate|__terminate)\b.*|_Unwind_\w+|demangling_terminate_handler"
 )
 KERNEL_MACHINERY = re.compile(
     r"panic|nmi_panic|dump_backtrace|show_stack|dump_stack|show_regs|die\w*|oops_\w+|bug_handler|brk_handler"
@@ -15,11 +15,11 @@ KERNEL_MACHINERY = re.compile(
     r"|io_schedule\w*|__switch_to|watchdog_timer_fn|hrtimer_interrupt|__hrtimer_\w+|__warn|warn_slowpath_\w+"
     r"|report_bug|trigger_\w+|rcu_\w+|print_\w+stall\w*|check_hung_\w+|watchdog"
 )
-NATIVE = re.compile(r"\s*#\d+ +pc +([0-9a-fA-F]+) +(\S+)(?: \((.+)\))?")
+NATIVE = re.compile(r"\s*#\d+ +pc +([0-9a-fA-F]+) +(\S+)(?: \(offset 0x[0-9a-f]+\))?(?: \((.+)\))?")
 JAVA = re.compile(r"\s*at ([\w.$<>/\-]+\([^)\n]{0,200}\))")
 EXCEPTION = re.compile(r"(?:Caused by: )?((?:[\w$]+\.)+[\w$]+)(?:: (.*))?$")
 PROGRAM_COUNTER = re.compile(
-    r"(?:PC is at|pc :|RIP: [\w]+:|EIP is at) *(?:\[<\w+>\] )?([A-Za-z_][\w.$]*)\+0x"
+    r"(?:PC is at|pc :|RIP: \w+:|EIP is at) *(?:\[<\w+>\] *)*([A-Za-z_][\w.$]*)\+0x"
 )
 KERNEL_FRAME = re.compile(
     r" *(?:\[<[0-9a-fA-F]+>\] )?\(?(?:\? )?([A-Za-z_][\w.$]*)\+0x[0-9a-f]+/0x"
@@ -42,24 +42,26 @@ def native_place(lines: Iterable[str]) -> str | None:
         if symbol.startswith("BuildId"):
             symbol = ""
         name = symbol.split(" (BuildId")[0]
-        offset = int(match[1], 16)
-        place = f"{match[2]} ({name})" if name else f"{match[2]}+0x{offset:x}"
+        place = f"{match[2]} ({name})" if name else f"{match[2]}+0x{int(match[1], 16):x}"
         first = first or place
-        if not NATIVE_MACHINERY.fullmatch(re.sub(r"(\(.*)?(\+\d+)?$", "", name) or "?"):
+        # What has no name in the C library is its part of aborting, or was called with nonsense.
+        nameless = not name and match[2].endswith("/libc.so")
+        bare = re.sub(r"(\(.*)?(\+\d+)?$", "", name)
+        if not nameless and not NATIVE_MACHINERY.fullmatch(bare):
             return place
     return first
 
 
 def java_place(lines: Iterable[str]) -> tuple[str, str | None]:
     """The root cause of an exception, and the first frame of its stack."""
-    reason, place = "", None
+    reason, place, waiting = "", None, False
     for line in lines:
         exception = EXCEPTION.match(line)
         if exception and (not reason or line.startswith("Caused by: ")):
             reason = line.removeprefix("Caused by: ").strip()
-            place = None
-        elif reason and place is None and (frame := JAVA.match(line)):
-            place = frame[1]
+            waiting = True
+        elif waiting and (frame := JAVA.match(line)):
+            place, waiting = frame[1], False
     return reason, place
 
 

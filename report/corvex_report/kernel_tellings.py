@@ -19,7 +19,11 @@ RULES = (
     ("lockup", DRIVER + r"(BUG *: (?:soft lockup|spinlock).*)", KERNEL),
     ("lockup", DRIVER + r"(Watchdog detected hard LOCKUP.*)", KERNEL),
     ("lockup", DRIVER + r"((?:INFO *: )?\w+ (?:self-)?detected stalls? on .*)", KERNEL),
-    ("lockup", DRIVER + r"(.{0,40}[Ww]atchdog [Bb](?:ark|ite).*)", KERNEL),
+    (
+        "lockup",
+        DRIVER + r"((?:Causing a )?[Ww]atchdog [Bb](?:ark|ite)\b(?! (?:time|irq)).*)",
+        KERNEL,
+    ),
 )
 PATTERNS = [(kind, re.compile(pattern), identity) for kind, pattern, identity in RULES]
 HUNG = re.compile(r"INFO *: (task (.{1,60}?):\d+ blocked for more than \d+ seconds)")
@@ -28,17 +32,14 @@ OUT_OF_MEMORY = re.compile(
 )
 KILLED = re.compile(r"Killed process (\d+) \((.{1,100}?)\)")
 COMM = re.compile(r"(?:CPU: \d+ PID: (\d+) Comm: (\S+)|Process (\S+) \(pid: (\d+))")
+STUCK = re.compile(r"stuck for \d+s! \[(.{1,40}?):\d+\]")
 BEGINNING = re.compile("|".join(f"(?:{pattern})" for _, pattern, _ in RULES) + "|" + HUNG.pattern)
 
 
 def told(mention: Mention) -> Iterator[Telling]:
     if mention.record.foreign:
         return
-    text = (
-        mention.record.kernel_text.replace(" : ", ": ")
-        if mention.record.tag
-        else (mention.record.text)
-    )
+    text = mention.record.kernel_text
     for kind, pattern, identity in PATTERNS:
         match = pattern.match(text)
         if match:
@@ -69,6 +70,8 @@ def _of_kernel(mention: Mention, kind: str, reason: str, identity: str) -> Telli
         if comm:
             process = comm[2] or comm[3]
             break
+    stuck = STUCK.search(reason)
+    process = process or (stuck[1] if stuck else None)
     known = {"where": kernel_place(own), "process": process, "identity": identity}
     return mention.telling(kind, 0 if kind == "kernel-oops" else 1, reason=reason, **known)
 

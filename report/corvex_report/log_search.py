@@ -29,7 +29,7 @@ PATTERNS = (
     "general protection fault: ",
     "hard LOCKUP",
     "detected stall",
-    "INFO *: task [^ ]{1,60} blocked for more than",
+    "INFO *: task .{1,60} blocked for more than",
     "[Ww]atchdog [Bb](ark|ite)",
     " watchdog *[(:].{0,16}Blocked in ",
     "setting system clock",

@@ -8,6 +8,7 @@ from jinja2 import Environment, FileSystemLoader, StrictUndefined
 from . import charts, timeline, wrong
 from .artefacts import OTHER
 from .capture import Capture, LogFile
+from .conditions import LIMITS_TEXT
 from .findings import Finding, findings, nothing_on
 from .incidents import Incident
 from .properties import groups, version_text
@@ -65,6 +66,7 @@ def render(capture: Capture, incidents: list[Incident], output: str) -> str:
             at_once=AT_ONCE,
             listed=LISTED,
             other=OTHER,
+            limits=LIMITS_TEXT,
         )
     )
     # A name may hold a byte that is no text; it has been escaped where it is shown.

@@ -19,6 +19,9 @@ KMSG = re.compile(rb"(?P<who>\d{1,6}),\d{1,20},(?P<us>\d{1,17}),[^;\n]{0,200};(?
 UPTIME = re.compile(
     rb"(?:<(?P<who>\d{1,6})>)?\[ *(?P<uptime>\d{1,10}\.\d{1,9})\](?:\[[^]\n]{0,40}\])? ?(?P<text>[^\n]*)"
 )
+VENDOR = re.compile(
+    r"^(?:<\d{1,6}>)?(?:\[ *\d{1,10}\.\d{1,9}\] ?)?(?:c\d{1,2} +\d{1,7} |\(\d\)\[\d{1,7}:[^]]{0,40}\] ?)?"
+)
 KERNEL = 8  # a number below it is of the kernel itself
 
 
@@ -35,8 +38,9 @@ class Record:
 
     @property
     def kernel_text(self) -> str:
-        """logcat takes the beginning of a kernel's line for a tag."""
-        return f"{self.tag}: {self.text}" if self.tag else self.text
+        """logcat takes the beginning of a kernel's line for a tag; vendors put more before it."""
+        named = self.tag not in ("", "kernel", "-")
+        return VENDOR.sub("", f"{self.tag}: {self.text}" if named else self.text, 1)
 
 
 Parse = Callable[[bytes], Record | None]

@@ -159,7 +159,7 @@ class SourcesTest(IncidentTest):
         expected = [
             ("hung-task", "mmcqd/0", "mmc_wait_for_req", 1),
             ("kernel-oops", "kworker/2:1", "cvx_panel_off", 1),
-            ("lockup", None, None, 1),
+            ("lockup", "x", None, 1),
         ]
         self.assertEqual(self.found(), expected)
 
