@@ -71,7 +71,7 @@ def tell(arguments: argparse.Namespace, progress: Progress) -> int:
     names = several.captures_in(directory)
     if names:
         return tell_several(arguments, names, progress)
-    capture = read_capture(directory, progress)
+    capture = read_capture(directory, progress, gaps=not arguments.merged)
     if arguments.merged:
         progress.end()
         return write(merged.merged(capture))

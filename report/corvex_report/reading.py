@@ -26,8 +26,8 @@ VERSION = re.compile(rb"Linux version ([^\n]{1,200})")
 Progress = Callable[[str], None]
 
 
-def read_capture(directory: str, progress: Progress) -> Capture:
-    """Raises OSError when the directory cannot be listed."""
+def read_capture(directory: str, progress: Progress, gaps: bool = True) -> Capture:
+    """Raises OSError when the directory cannot be listed. Who does not ask for gaps is served sooner."""
     name = os.path.basename(os.path.realpath(directory))
     match = NAME.fullmatch(name)
     begun = artefacts.stamp_time(match["time"]) if match else None
@@ -39,12 +39,18 @@ def read_capture(directory: str, progress: Progress) -> Capture:
         near = begun
     else:  # no time in the name, or the one of a clock that was set later
         begun = None
-    return _Reading(directory, name, entries, near, progress).capture(number, begun)
+    return _Reading(directory, name, entries, near, progress, gaps).capture(number, begun)
 
 
 class _Reading:
     def __init__(
-        self, directory: str, name: str, entries: list[Entry], near: float, progress: Progress
+        self,
+        directory: str,
+        name: str,
+        entries: list[Entry],
+        near: float,
+        progress: Progress,
+        gaps: bool,
     ) -> None:
         self._directory = directory
         self._name = name
@@ -52,6 +58,7 @@ class _Reading:
         self._near = near
         self._calendar = Calendar(near)
         self._progress = progress
+        self._gaps = gaps
         self._unreadable = [(entry.path, entry.problem) for entry in entries if entry.problem]
         self._logs: dict[str, LogFile] = {}
         self._properties = parse_properties(self._head("getprop.txt", PROPERTIES) or b"")
@@ -103,7 +110,7 @@ class _Reading:
             return log
         try:
             with Reader(self._directory, entry) as reader:
-                log.track, log.ending = read_track(reader, self._calendar)
+                log.track, log.ending = read_track(reader, self._calendar, self._gaps)
         except OSError as error:
             self._unreadable.append((entry.path, f"cannot be read: {error.strerror}"))
         return log

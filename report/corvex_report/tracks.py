@@ -51,23 +51,23 @@ def find_line_format(head: bytes, calendar: Calendar) -> LineFormat | None:
     return best if count else None
 
 
-def read_track(reader: Reader, calendar: Calendar) -> tuple[Track | None, str]:
+def read_track(reader: Reader, calendar: Calendar, gaps: bool) -> tuple[Track | None, str]:
     """With what is wrong with the end of the file, as a half sentence; usually nothing."""
     head = reader.read(0, HEAD)
     packets = pcap_format(head)
     if packets:
-        return _packets(reader, packets)
+        return _packets(reader, packets, WALKED if gaps else WHOLE)
     track, found = None, find_line_format(head, calendar)
     if found and reader.size > WHOLE:
-        track = _sample(reader, found, calendar)
+        track = _sample(reader, found, calendar, gaps)
     elif found:
         times = found.times(reader.read(0, reader.size), calendar, True)
         track = Track(found, times[0], times[-1], steps_between(times)) if times else None
     return track, _last_line_problem(reader)
 
 
-def _packets(reader: Reader, found: PcapFormat) -> tuple[Track | None, str]:
-    whole = reader.size <= WALKED
+def _packets(reader: Reader, found: PcapFormat, most: int) -> tuple[Track | None, str]:
+    whole = reader.size <= most
     times, cut = found.walk(reader.read(0, reader.size if whole else WHOLE))
     if not times:
         return None, ""
@@ -77,7 +77,7 @@ def _packets(reader: Reader, found: PcapFormat) -> tuple[Track | None, str]:
     return Track(found, times[0], times[-1], steps_between(times)), ending
 
 
-def _sample(reader: Reader, found: LineFormat, calendar: Calendar) -> Track | None:
+def _sample(reader: Reader, found: LineFormat, calendar: Calendar, gaps: bool) -> Track | None:
     def times_at(offset: int, length: int) -> list[float]:
         return found.times(reader.read(offset, length), calendar, offset == 0)
 
@@ -87,6 +87,8 @@ def _sample(reader: Reader, found: LineFormat, calendar: Calendar) -> Track | No
     if not head:
         return None
     track = Track(found, head[0], tail[-1] if tail else None, sampled=True)
+    if not gaps:
+        return track
     while high - low > WHOLE:
         places = [low + (high - low) * i // PLACES for i in range(PLACES + 1)]
         points = [(place, times_at(place, found.block)) for place in places]
