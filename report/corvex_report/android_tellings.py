@@ -5,7 +5,7 @@ import re
 from collections.abc import Callable, Iterator, Sequence
 from dataclasses import dataclass
 
-from .crash_texts import FATAL, java_crash, native_crash, signal_reason
+from .crash_texts import FATAL, Crash, java_crash, native_crash, signal_reason
 from .frames import JAVA
 from .incidents import SYSTEM, Telling
 from .records import Record
@@ -22,14 +22,10 @@ class Mention:
     time: float | None
     following: Callable[[], Sequence[str]]
 
-    def telling(self, kind: str, rank: int, **known: object) -> Telling:
+    def telling(self, kind: str, rank: int, crash: Crash) -> Telling:
         uptime = self.record.time if self.time is None else None
-        told = Telling(kind, self.time, self.file, self.line, rank=rank, uptime=uptime)
-        told.offset = self.offset
-        for name, value in known.items():
-            setattr(told, name, value)
-        told.__post_init__()
-        return told
+        place = {"line": self.line, "offset": self.offset}
+        return Telling.of(crash, kind, self.time, self.file, rank, uptime=uptime, **place)
 
 
 Match = re.Match[str]
@@ -38,74 +34,69 @@ Match = re.Match[str]
 def _fatal_signal(mention: Mention, match: Match) -> Telling:
     main = match[5] if match[4] and int(match[4]) == mention.record.pid else None
     thread = match[7] or main
-    return mention.telling(
-        "native-crash",
-        6,
-        pid=int(match[6]) if match[6] else mention.record.pid,
-        reason=signal_reason(match[1], match[2], match[3]),
-        process=SYSTEM if thread == SYSTEM else None,
+    crash = Crash(
+        SYSTEM if thread == SYSTEM else None,
+        int(match[6]) if match[6] else mention.record.pid,
+        signal_reason(match[1], match[2], match[3]),
         thread=thread,
     )
+    return mention.telling("native-crash", 6, crash)
 
 
 def _dumped(mention: Mention, _: Match) -> Telling | None:
     crash = native_crash([mention.record.text, *mention.following()])
-    if crash is None:
-        return None
-    known = {"process": crash.process, "pid": crash.pid, "reason": crash.reason}
-    return mention.telling("native-crash", 2, where=crash.where, **known)
+    return mention.telling("native-crash", 2, crash) if crash else None
 
 
 def _exception(mention: Mention, match: Match) -> Telling:
     crash = java_crash(mention.following())
-    process = SYSTEM if match[1] else crash.process
-    known = {"process": process, "pid": crash.pid or mention.record.pid}
-    return mention.telling("java-crash", 2, reason=crash.reason, where=crash.where, **known)
+    crash.process = SYSTEM if match[1] else crash.process
+    crash.pid = crash.pid or mention.record.pid
+    return mention.telling("java-crash", 2, crash)
 
 
 def _not_responding(mention: Mention, match: Match) -> Telling:
-    texts = list(mention.following())[:12]
-    reason = next((t.removeprefix("Reason: ") for t in texts if t.startswith("Reason: ")), "")
-    pid = next((t.removeprefix("PID: ").strip() for t in texts if t.startswith("PID: ")), "")
-    known = {"process": match[1], "pid": int(pid) if pid.isdecimal() else None}
-    return mention.telling("anr", 2, reason=reason.strip(), **known)
+    said: dict[str, str] = {}
+    for text in list(mention.following())[:12]:
+        name, _, value = text.partition(": ")
+        said.setdefault(name, value.strip())
+    pid = said.get("PID", "")
+    crash = Crash(match[1], int(pid) if pid.isdecimal() else None, said.get("Reason", ""))
+    return mention.telling("anr", 2, crash)
 
 
 def _watchdog(mention: Mention, match: Match) -> Telling:
     frames = (frame[1] for text in mention.following() if (frame := JAVA.match(text)))
-    known = {"reason": match[1], "where": next(frames, None), "process": SYSTEM}
-    return mention.telling("system-restart", 2, **known)
+    return mention.telling("system-restart", 2, Crash(SYSTEM, None, match[1], next(frames, None)))
 
 
 def _zygote(mention: Mention, match: Match) -> Telling:
-    known = {"process": SYSTEM, "pid": int(match[1]), "reason": "system server has terminated"}
-    return mention.telling("system-restart", 9, **known)
+    crash = Crash(SYSTEM, int(match[1]), "system server has terminated")
+    return mention.telling("system-restart", 9, crash)
 
 
 def _am_crash(mention: Mention, match: Match) -> Telling:
-    native = match[4].startswith("Native crash")
-    known = {"process": match[3], "pid": max(int(match[1]), int(match[2]))}
+    kind = "native-crash" if match[4].startswith("Native crash") else "java-crash"
     where = f"{match[6]}:{match[7]}" if match[6] not in ("", "unknown", "null") else None
     reason = match[4] + (f": {match[5]}" if match[5] and match[5] != "null" else "")
-    kind = "native-crash" if native else "java-crash"
-    return mention.telling(kind, 8, reason=reason, where=where, **known)
+    return mention.telling(kind, 8, Crash(match[3], _pid(match), reason, where))
 
 
 def _am_anr(mention: Mention, match: Match) -> Telling:
-    known = {"process": match[3], "pid": max(int(match[1]), int(match[2]))}
-    return mention.telling("anr", 8, reason=match[4].strip(), **known)
+    return mention.telling("anr", 8, Crash(match[3], _pid(match), match[4].strip()))
 
 
-def _killed(mention: Mention, match: Match) -> Telling | None:
-    return low_memory(mention, match)
+def _pid(match: Match) -> int:
+    """The event has a user's number, too, before it or behind it."""
+    return max(int(match[1]), int(match[2]))
 
 
 def low_memory(mention: Mention, match: Match) -> Telling | None:
     """Only the loss of what the user looks at, or of what the system is, went wrong."""
     if int(match[3]) > 0:
         return None
-    known = {"process": match[1], "pid": int(match[2]), "reason": f"low memory, adj {match[3]}"}
-    return mention.telling("out-of-memory", 4, **known)
+    crash = Crash(match[1], int(match[2]), f"low memory, adj {match[3]}")
+    return mention.telling("out-of-memory", 4, crash)
 
 
 LOW_MEMORY = re.compile(r"Kill(?:ing)? '(.{1,100}?)' \((\d+)\).*?(?:oom_(?:score_)?)?adj (-?\d+)")
@@ -133,7 +124,7 @@ MAIN_RULES: tuple[Rule, ...] = (
         re.compile(r"Exit zygote because system server \((?:pid )?(\d{1,9})\) has "),
         _zygote,
     ),
-    ("lowmemorykiller", "VDIWEF", LOW_MEMORY, _killed),
+    ("lowmemorykiller", "VDIWEF", LOW_MEMORY, low_memory),
 )
 EVENT_RULES: tuple[Rule, ...] = (
     (

@@ -44,16 +44,7 @@ def told(directory: str, entry: Entry, clock: Clock, calendar: Calendar) -> Tell
     # A directory of that time holds what came while the capture ran.
     time = own if own is not None else name_time(entry.path.removeprefix(top), clock)
     rank = (1 if top == "tombstones" else 3) if tag is None else 4
-    return Telling(
-        kind,
-        time,
-        entry.path,
-        process=crash.process,
-        pid=crash.pid,
-        reason=crash.reason,
-        where=crash.where,
-        rank=rank,
-    )
+    return Telling.of(crash, kind, time, entry.path, rank)
 
 
 def _seconds(text: str, calendar: Calendar) -> float | None:

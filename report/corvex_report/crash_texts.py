@@ -21,11 +21,15 @@ MAIN = '"main" '
 
 @dataclass
 class Crash:
+    """What one text says of one occurrence."""
+
     process: str | None = None
     pid: int | None = None
     reason: str = ""
     where: str | None = None
     time: str = ""  # as a trace has it
+    thread: str | None = None  # what the process is called by who does not know its name
+    identity: str = ""  # of what is no process
 
 
 def signal_reason(signal: str, code: str | None, address: str | None) -> str:

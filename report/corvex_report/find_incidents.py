@@ -9,10 +9,9 @@ from . import android_tellings, artefact_tellings, conditions, kernel_tellings
 from .android_tellings import EVENT_RULES, MAIN_RULES, Mention
 from .artefact_tellings import KERNEL_TAGS, dropbox_tag
 from .capture import Capture
-from .clock import told_boot
 from .files import Entry, Reader, open_text
 from .incidents import Incident, Telling, incidents
-from .log_search import LINE, MOST, search
+from .log_search import LINE, MOST, search, start_of_device
 from .records import Record, record_parser
 
 AHEAD = 65536  # bytes behind a mention in which its writer goes on
@@ -22,7 +21,7 @@ LATER = 5.0  # seconds for which it goes on
 
 KERNEL, ANDROID, EVENTS = "kernel", "android", "events"
 NAMES = (
-    (re.compile(r"(?:android|radio)(?:_boot|_initial)?\.log"), ANDROID),
+    (re.compile(r"android(?:_boot|_initial)?\.log"), ANDROID),
     (re.compile(r"event(?:_boot|_initial)?\.log"), EVENTS),
     (re.compile(r"kernel(?:_boot|_initial)?\.log"), KERNEL),
 )
@@ -78,9 +77,8 @@ class _Log:
                 text = f"has over {MOST} lines that may tell of an incident; the rest was not read"
                 self._capture.unreadable.append((self._entry.path, text))
             lines = [(hit, reader.read(hit.offset, LINE).split(b"\n")[0]) for hit in hits]
-            if self._kind == KERNEL and self._boot is None:
-                told = [boot for _, line in lines if (boot := told_boot(line)) is not None]
-                self._boot = told[-1] if told else None
+            if hits and self._kind == KERNEL and self._boot is None:
+                self._boot = start_of_device(reader)
             for hit, line in lines:
                 record = self._parse(line)
                 if record is None:

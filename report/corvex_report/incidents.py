@@ -5,6 +5,8 @@ import re
 from collections.abc import Iterable
 from dataclasses import dataclass, field
 
+from .crash_texts import Crash
+
 # From the most serious on.
 RANKS = {
     "kernel-panic": 0,
@@ -42,7 +44,28 @@ class Telling:
     uptime: float | None = None  # where there is no time of day
     offset: int = 0  # of the line
 
+    @classmethod
+    def of(
+        cls,
+        crash: Crash,
+        kind: str,
+        time: float | None,
+        file: str,
+        rank: int,
+        line: int = 0,
+        offset: int = 0,
+        uptime: float | None = None,
+    ) -> "Telling":
+        told = cls(kind, time, file, line, crash.process, crash.pid, crash.reason, crash.where)
+        told.rank, told.identity, told.thread = rank, crash.identity, crash.thread
+        told.uptime, told.offset = uptime, offset
+        return told
+
     def __post_init__(self) -> None:
+        self.know(self.process)
+
+    def know(self, process: str | None) -> None:
+        self.process = process
         if self.process == SYSTEM and self.kind in ("native-crash", "java-crash"):
             self.kind = "system-restart"
 
@@ -148,10 +171,25 @@ def incidents(tellings: Iterable[Telling]) -> list[Incident]:
 
 def occurrences(tellings: list[Telling]) -> list[Occurrence]:
     dated = sorted((t for t in tellings if t.time is not None), key=lambda t: t.time or 0.0)
+    _name(dated)
     found = _together([(t.time or 0.0, "", t) for t in dated])
     by_uptime = [(t.uptime, t.file, t) for t in tellings if t.time is None and t.uptime is not None]
     found += _copies(_together(sorted(by_uptime, key=lambda one: (one[1], one[0]))))
     return found + [Occurrence([t]) for t in tellings if t.time is None and t.uptime is None]
+
+
+def _name(dated: list[Telling]) -> None:
+    """Who knows only a number learns the name from who knows both."""
+    names = {
+        (t.pid, (t.time or 0.0) // WITHIN): t.process
+        for t in dated
+        if t.process and t.pid is not None
+    }
+    for telling in dated:
+        if telling.process is None and telling.pid is not None:
+            about = (telling.time or 0.0) // WITHIN
+            near = (names.get((telling.pid, about + step)) for step in (0, 1, -1))
+            telling.know(next((name for name in near if name), None))
 
 
 def _together(tellings: list[tuple[float, str, Telling]]) -> list[Occurrence]:

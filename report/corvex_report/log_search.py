@@ -6,6 +6,7 @@ import subprocess
 from collections.abc import Iterator
 from dataclasses import dataclass
 
+from .clock import told_boot
 from .files import Reader
 
 # What the first line of a mention holds. What it means is decided when it has been taken apart.
@@ -18,12 +19,13 @@ PATTERNS = (
     "Exit zygote because system server",
     " am_crash *[(:]",
     " am_anr *[(:]",
-    "Kill(ing|ed)? (process [0-9]|')",
+    "Kill(ed)? process [0-9]",
+    "Kill(ing)? '.{1,140}adj (0|-)",
     "Kernel panic - not syncing",
     "Unable to handle kernel",
     "Internal error: ",
     "kernel BUG at ",
-    "BUG *: (unable to handle|soft lockup|spinlock)",
+    "BUG *: (unable to handle|soft lockup|spinlock lockup)",
     "Unhandled fault: ",
     "Bad mode in ",
     "general protection fault: ",
@@ -32,10 +34,10 @@ PATTERNS = (
     "INFO *: task .{1,60} blocked for more than",
     "[Ww]atchdog [Bb](ark|ite)",
     " watchdog *[(:].{0,16}Blocked in ",
-    "setting system clock",
-    "PM: suspend (entry|exit)",
 )
-GREP = ["grep", "-a", "-b", "-n", "-o", "-E", "|".join(PATTERNS)]
+# Lines in which a kernel tells the time of day.
+CLOCK = ("setting system clock", "PM: suspend (entry|exit)")
+GREP = ["grep", "-a", "-b", "-n", "-o", "-E"]
 MOST = 5000  # lines of one file
 LINE = 4096  # bytes of a line that are read
 BEFORE = 512  # bytes of a line before the text that was found
@@ -47,10 +49,18 @@ class Hit:
     offset: int  # of the line
 
 
-def search(reader: Reader) -> Iterator[Hit]:
+def start_of_device(reader: Reader) -> float | None:
+    """Of the one whose kernel wrote this, in UTC, if it says so. Raises OSError."""
+    lines = (reader.read(hit.offset, LINE).split(b"\n")[0] for hit in search(reader, CLOCK))
+    told = [boot for line in lines if (boot := told_boot(line)) is not None]
+    return told[-1] if told else None
+
+
+def search(reader: Reader, patterns: tuple[str, ...] = PATTERNS) -> Iterator[Hit]:
     """Raises OSError. What is found too far from its line's beginning begins no record."""
+    os.lseek(reader.fileno(), 0, os.SEEK_SET)
     grep = subprocess.Popen(
-        [*GREP, f"--max-count={MOST}"],
+        [*GREP, "|".join(patterns), f"--max-count={MOST}"],
         stdin=reader.fileno(),
         stdout=subprocess.PIPE,
         stderr=subprocess.DEVNULL,

@@ -6,9 +6,8 @@ from collections.abc import Callable, Iterator
 
 from .artefacts import LOGS
 from .capture import Capture
-from .clock import told_boot
-from .files import Entry, Reader, open_text
-from .log_search import LINE, search
+from .files import Entry, open_text
+from .log_search import start_of_device
 from .records import record_parser, threadtime
 
 CHUNK = 65536
@@ -55,7 +54,7 @@ class _Source:
             try:
                 with open_text(self._directory, entry) as reader:
                     live = os.sep not in entry.path
-                    self._boot = self._clock.boot if live else _start(reader)
+                    self._boot = self._clock.boot if live else start_of_device(reader)
                     with open(os.dup(reader.fileno()), "rb", CHUNK) as file:
                         file.seek(0)
                         for line in _short_lines(file.readline):
@@ -93,10 +92,3 @@ def _short_lines(readline: Callable[[int], bytes]) -> Iterator[bytes]:
         yield line.rstrip(b"\r\n")
         while not whole and (rest := readline(CHUNK)):
             whole = rest.endswith(b"\n")
-
-
-def _start(reader: Reader) -> float | None:
-    """When the device started whose kernel wrote this, in UTC."""
-    lines = (reader.read(hit.offset, LINE).split(b"\n")[0] for hit in search(reader))
-    told = [boot for line in lines if (boot := told_boot(line)) is not None]
-    return told[-1] if told else None

@@ -163,6 +163,27 @@ class SourcesTest(IncidentTest):
         ]
         self.assertEqual(self.found(), expected)
 
+    def test_the_system_server_and_other_forms_of_lines(self) -> None:
+        """logcat -v time has no thread; vendors put more before a kernel's message."""
+        at = stamp(BEGUN + 30, "%m-%d %H:%M:%S.000")
+        signal = "Fatal signal 6 (SIGABRT), code -6 in tid 930 (android.bg)"
+        server = ABORTED.replace("/vendor/bin/camera", "system_server").replace("3001", "911")
+        dumped = "".join(f"{at} F/DEBUG   ( 9000): {line}\n" for line in server.splitlines())
+        self.android(
+            f"{at} F/libc    (  911): {signal}\n{dumped}".encode(),
+            lines(
+                BEGUN + 33,
+                498,
+                "E Zygote",
+                "Exit zygote because system server (911) has terminated",
+            ),
+        )
+        log = lines(BEGUN + 60, 0, "I -", f"<0>[ 5123.456] (2)[9:x]{PANIC.replace('Fatal', 'Bad')}")
+        put(self.capture / "boot_log/kernel_boot.log", log, END)
+        queue = "/vendor/lib64/libqueue.so (Queue::push(int)+112)"
+        expected = [("kernel-panic", None, None, 1), ("system-restart", "system_server", queue, 1)]
+        self.assertEqual(self.found(), expected)
+
     def test_earlier_boots_have_their_own_times_or_none(self) -> None:
         told = "rtc: setting system clock to 2026-11-20 10:00:00 UTC (1795168800)\n"
         put(self.capture / "recovery/last_kmsg", dmesg(8, told) + dmesg(70, OOPS + PANIC), END)
