@@ -22,6 +22,8 @@ UPTIME = re.compile(
 VENDOR = re.compile(
     r"^(?:<\d{1,6}>)?(?:\[ *\d{1,10}\.\d{1,9}\] ?)?(?:c\d{1,2} +\d{1,7} |\(\d\)\[\d{1,7}:[^]]{0,40}\] ?)?"
 )
+LEVELS = "FFFEWIID"  # of the kernel's eight
+INFO = 6
 KERNEL = 8  # a number below it is of the kernel itself
 
 
@@ -65,22 +67,25 @@ def record_parser(calendar: Calendar) -> Parse:
             )
         match = KMSG.match(line)
         if match:
-            foreign = int(match["who"]) >= KERNEL
-            return Record(int(match["us"]) / 1e6, True, text_of(match["text"]), foreign=foreign)
+            return _of_kernel(int(match["us"]) / 1e6, int(match["who"]), match["text"])
         match = UPTIME.match(line)
         if match:
-            foreign = int(match["who"] or 0) >= KERNEL
-            return Record(float(match["uptime"]), True, text_of(match["text"]), foreign=foreign)
+            return _of_kernel(float(match["uptime"]), int(match["who"] or INFO), match["text"])
         return None
 
     return parse
+
+
+def _of_kernel(uptime: float, who: int, text: bytes) -> Record:
+    level = LEVELS[who % KERNEL]
+    return Record(uptime, True, text_of(text), level=level, foreign=who >= KERNEL)
 
 
 def threadtime(record: Record, time: float, tag: str) -> bytes:
     """As logcat -v threadtime has it."""
     stamp = f"{date_time(time)[5:]}.{int(time % 1 * 1000):03}"
     pid, tid = record.pid or 0, record.tid or record.pid or 0
-    text = f"{stamp} {pid:5} {tid:5} {record.level or 'I'} {tag:<8}: {record.text}"
+    text = f"{stamp} {pid:5} {tid:5} {record.level} {tag:<8}: {record.text}"
     return text.encode("utf-8", "replace")
 
 
