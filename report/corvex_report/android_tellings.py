@@ -7,7 +7,7 @@ from dataclasses import dataclass
 
 from .crash_texts import FATAL, Crash, java_crash, native_crash, signal_reason
 from .frames import JAVA
-from .incidents import SYSTEM, Telling
+from .occurrences import SYSTEM, Telling
 from .records import Record
 
 

@@ -8,7 +8,7 @@ from .artefacts import BINDER_STATE, name_time
 from .clock import Clock
 from .crash_texts import PROCESS, Crash, java_crash, native_crash, not_responding
 from .files import Entry, open_text
-from .incidents import SYSTEM, Telling
+from .occurrences import SYSTEM, Telling
 from .line_formats import Calendar
 from .records import text_of
 

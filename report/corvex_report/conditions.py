@@ -3,7 +3,7 @@
 import re
 from collections.abc import Iterator
 
-from .incidents import Telling
+from .occurrences import Telling
 from .thermal import Record
 
 # Degrees beyond which a zone is too hot: those on the chip bear more than those on the board.

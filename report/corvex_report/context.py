@@ -6,7 +6,7 @@ from dataclasses import dataclass
 
 from .capture import Capture, LogFile
 from .files import Entry, Reader, open_text
-from .incidents import Telling
+from .occurrences import Telling
 from .records import record_parser, text_of, threadtime
 
 AROUND = 20  # lines

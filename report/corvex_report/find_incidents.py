@@ -10,7 +10,8 @@ from .android_tellings import EVENT_RULES, MAIN_RULES, Mention
 from .artefact_tellings import KERNEL_TAGS, dropbox_tag
 from .capture import Capture
 from .files import Entry, Reader, open_text
-from .incidents import Incident, Telling, incidents
+from .incidents import Incident, incidents
+from .occurrences import Telling
 from .log_search import LINE, MOST, search, start_of_device
 from .records import Record, record_parser
 

@@ -6,7 +6,7 @@ from collections.abc import Iterator
 from .android_tellings import LOW_MEMORY, Mention, low_memory
 from .crash_texts import Crash
 from .frames import kernel_place
-from .incidents import Telling
+from .occurrences import Telling
 
 DRIVER = r"(?:[\w.,@-]{1,60}(?: [\w.,@-]{1,60})?: )?"
 KERNEL = "kernel"  # there is one, whatever process it was in

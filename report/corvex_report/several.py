@@ -10,7 +10,8 @@ from urllib.parse import quote
 from . import machine
 from .capture import Capture
 from .find_incidents import find_incidents
-from .incidents import RANKS, Incident, key
+from .incidents import Incident, key
+from .occurrences import RANKS
 from .page import environment, render
 from .properties import version_text
 from .reading import NAME, read_capture

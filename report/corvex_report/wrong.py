@@ -8,7 +8,8 @@ from urllib.parse import quote
 from .capture import Capture
 from .context import WIDTH, Context, Said
 from .files import open_text
-from .incidents import RANKS, Incident
+from .incidents import Incident
+from .occurrences import RANKS
 from .records import text_of
 from .text import clock_text, span_text
 from .timeline import kind_title
