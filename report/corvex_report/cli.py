@@ -51,7 +51,10 @@ def parse_arguments() -> argparse.Namespace:
     forms.add_argument("--json", action="store_true", help="print it as a JSON document instead")
     forms.add_argument("--ndjson", action="store_true", help="print a JSON object an incident")
     forms.add_argument("--merged", action="store_true", help="print all logs as one, by time")
-    return parser.parse_args()
+    arguments = parser.parse_args()
+    if arguments.output and (arguments.json or arguments.ndjson or arguments.merged):
+        parser.error("-o names a page; --json, --ndjson and --merged print")
+    return arguments
 
 
 def write(lines: Iterable[bytes]) -> int:

@@ -6,7 +6,7 @@ from dataclasses import dataclass, field
 
 from .occurrences import RANKS, Occurrence, Telling, occurrences
 
-NUMBERS = re.compile(r"0[xX][0-9a-fA-F]+|\b[0-9a-fA-F]{7,16}\b|\d+")
+NUMBERS = re.compile(r"0[xX][0-9a-fA-F]+|\b(?=[a-fA-F]*\d)[0-9a-fA-F]{7,16}\b|\d+")
 
 
 @dataclass
