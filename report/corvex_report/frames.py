@@ -5,15 +5,18 @@ from collections.abc import Iterable
 
 # What stands between a fault and the frame that is to blame for it.
 NATIVE_MACHINERY = re.compile(
-    r"_*(libc_)?(android_)?abort(_message)?|raise|tgkill|tkill|pthread_kill|syscall|gsignal|__(libc_)?fatal\w*|__assert\w*|__android_log_assert"
-    r"|__stack_chk_fail|__fortify\w*|__cxa_\w+|__cfi_\w+|android::base::(DefaultAborter|LogMessage::~LogMessage)\b.*"
-    r"|art::Runtime::Abort\b.*|std::(__\w+::)?(terminate|__terminate)\b.*|_Unwind_\w+|demangling_terminate_handler"
+    r"_*(libc_)?(android_)?abort(_message)?|raise|tgkill|tkill|pthread_kill|syscall|gsignal"
+    r"|__(libc_)?fatal\w*|__assert\w*|__android_log_assert|__stack_chk_fail|__fortify\w*"
+    r"|__cxa_\w+|__cfi_\w+|_Unwind_\w+|demangling_terminate_handler|art::Runtime::Abort\b.*"
+    r"|android::base::(DefaultAborter|LogMessage::~LogMessage)\b.*"
+    r"|std::(__\w+::)?(terminate|__terminate)\b.*"
 )
 KERNEL_MACHINERY = re.compile(
-    r"panic|nmi_panic|dump_backtrace|show_stack|dump_stack|show_regs|die\w*|oops_\w+|bug_handler|brk_handler"
-    r"|__do_kernel_fault\w*|do_\w+_(fault|abort)|do_debug_exception|el[01]_\w+|(__)?schedule|schedule_\w+"
-    r"|io_schedule\w*|__switch_to|watchdog_timer_fn|hrtimer_interrupt|__hrtimer_\w+|__warn|warn_slowpath_\w+"
-    r"|report_bug|trigger_\w+|rcu_\w+|print_\w+stall\w*|check_hung_\w+|watchdog"
+    r"panic|nmi_panic|dump_backtrace|show_stack|dump_stack|show_regs|die\w*|oops_\w+|bug_handler"
+    r"|brk_handler|report_bug|__do_kernel_fault\w*|do_\w+_(fault|abort)|do_debug_exception"
+    r"|el[01]_\w+|(__)?schedule|schedule_\w+|io_schedule\w*|__switch_to|watchdog|watchdog_timer_fn"
+    r"|hrtimer_interrupt|__hrtimer_\w+|__warn|warn_slowpath_\w+|trigger_\w+|rcu_\w+"
+    r"|print_\w+stall\w*|check_hung_\w+"
 )
 NATIVE = re.compile(r"\s*#\d+ +pc +([0-9a-fA-F]+) +(\S+)(?: \(offset 0x[0-9a-f]+\))?(?: \((.+)\))?")
 JAVA = re.compile(r"\s*at ([\w.$<>/\-]+\([^)\n]{0,200}\))")

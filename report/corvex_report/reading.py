@@ -27,7 +27,7 @@ Progress = Callable[[str], None]
 
 
 def read_capture(directory: str, progress: Progress, gaps: bool = True) -> Capture:
-    """Raises OSError when the directory cannot be listed. Who does not ask for gaps is served sooner."""
+    """Raises OSError when the directory cannot be listed. Without gaps it is done sooner."""
     name = os.path.basename(os.path.realpath(directory))
     match = NAME.fullmatch(name)
     begun = artefacts.stamp_time(match["time"]) if match else None

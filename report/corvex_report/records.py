@@ -17,10 +17,12 @@ LOGCAT = re.compile(
 # A record of /dev/kmsg; of its number, all but the lowest three bits say who wrote it.
 KMSG = re.compile(rb"(?P<who>\d{1,6}),\d{1,20},(?P<us>\d{1,17}),[^;\n]{0,200};(?P<text>[^\n]*)")
 UPTIME = re.compile(
-    rb"(?:<(?P<who>\d{1,6})>)?\[ *(?P<uptime>\d{1,10}\.\d{1,9})\](?:\[[^]\n]{0,40}\])? ?(?P<text>[^\n]*)"
+    rb"(?:<(?P<who>\d{1,6})>)?\[ *(?P<uptime>\d{1,10}\.\d{1,9})\](?:\[[^]\n]{0,40}\])? ?"
+    rb"(?P<text>[^\n]*)"
 )
 VENDOR = re.compile(
-    r"^(?:<\d{1,6}>)?(?:\[ *\d{1,10}\.\d{1,9}\] ?)?(?:c\d{1,2} +\d{1,7} |\(\d\)\[\d{1,7}:[^]]{0,40}\] ?)?"
+    r"^(?:<\d{1,6}>)?(?:\[ *\d{1,10}\.\d{1,9}\] ?)?"
+    r"(?:c\d{1,2} +\d{1,7} |\(\d\)\[\d{1,7}:[^]]{0,40}\] ?)?"
 )
 LEVELS = "FFFEWIID"  # of the kernel's eight
 INFO = 6

@@ -15,7 +15,7 @@ from .occurrences import RANKS
 from .page import environment, render
 from .properties import version_text
 from .reading import NAME, read_capture
-from .text import counted, date_time, duration_text
+from .text import date_time, duration_text
 from .timeline import kind_title
 
 OF_A_CAPTURE = ("getprop.txt", "versionNumber")
@@ -125,7 +125,7 @@ def _row(capture: Capture, incidents: list[Incident]) -> Row:
         "" if capture.begun is None else date_time(capture.begun),
         lasted,
         build or capture.properties.get(machine.BUILD, ""),
-        [counted(count, kind_title(kind)) for kind, count in kinds.items()],
+        [f"{kind_title(kind)} × {count}" for kind, count in kinds.items()],
     )
 
 

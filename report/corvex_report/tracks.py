@@ -1,7 +1,8 @@
 """What the times in one file say: from when to when, where it is silent, where the clock steps.
 
-A small log and most packet files are read whole. Of a large log the head, the tail and a few places between are read, and
-where the most time passes between two of those, it is looked at more closely."""
+A small log and most packet files are read whole. Of a large log the head, the tail and a few places
+between are read, and where the most time passes between two of those, it is looked at more closely.
+"""
 
 from dataclasses import dataclass, field
 
