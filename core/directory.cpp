@@ -7,6 +7,8 @@
 
 #include <utility>
 
+#include "core/log.h"
+
 using android::base::unique_fd;
 
 namespace corvexd {
@@ -95,9 +97,11 @@ Directory open_directory_at(int parent, const char* name) {
 }
 
 struct dirent* next_entry(const Directory& directory) {
+  errno = 0;
   while (struct dirent* entry = readdir(directory.get())) {
     if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0) return entry;
   }
+  if (errno != 0) log_error("corvexd: Error: %s\n", strerror(errno));
   return nullptr;
 }
 

@@ -41,7 +41,8 @@ using Directory = std::unique_ptr<DIR, CloseDirectory>;
 Directory open_directory(const char* path);
 Directory open_directory_at(int parent, const char* name);
 
-// The next entry that is neither "." nor ".."; null at the end. Valid until the next call.
+// The next entry that is neither "." nor ".."; null at the end, or when the listing fails (logged).
+// Valid until the next call.
 struct dirent* next_entry(const Directory& directory);
 
 // Whether the entry itself (not what a link names) is a directory.

@@ -35,8 +35,11 @@ constexpr struct {
     {"inotify_add_watch", ""},  // a directory that is not there is not watched
     {"read", "copy_file"},      // what can be copied is
     {"write", "copy_file"},
-    {"clone", "start_child"},     // whose child cannot be started is missing
-    {"", "open_program_output"},  // told on standard error, where a shell would tell it
+    {"clone", "start_child"},          // whose child cannot be started is missing
+    {"execve", "start_child"},         // and so is one that becomes no program
+    {"mmap", ""},                      // or that lacks memory
+    {"access", "make_log_directory"},  // a marker that cannot be read is not there
+    {"", "open_program_output"},       // told on standard error, where a shell would tell it
 };
 
 bool is_silent(const Call& call) {

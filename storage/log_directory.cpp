@@ -160,6 +160,7 @@ Path provide_current_directory() {
   std::lock_guard<std::mutex> lock(current_directory_mutex);
   Path path;
   if (find_current_directory(WhichMark::kFirst, &path)) return path;
+  if (errno != 0 && errno != ENOENT) log_error("corvexd: Error: %s\n", strerror(errno));
   make_log_directory();
   return LOG_DIR.get();
 }
