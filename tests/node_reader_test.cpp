@@ -213,6 +213,11 @@ TEST_F(Reader, BootloaderLogIsCopiedToItsEnd) {
   EXPECT_EQ((Texts{"E/corvexd: tz log node can not be read: No such file or directory \n",
                    "E/corvexd: Open /proc/tzdbg/tz_log Error No such file or directory\n"}),
             log.lines());
+  log.clear();
+  start(kKernelReader, "/data/none");
+  EXPECT_EQ(1, end());
+  EXPECT_EQ(Texts{"E/corvexd: Kernel log node can not be read: No such file or directory \n"},
+            log.lines());
   start(kBootloaderReader, "/data");
   EXPECT_EQ(1, end());
   EXPECT_TRUE(

@@ -90,6 +90,7 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   usleep(50'000);
   EXPECT_EQ("", current_directory());
   EXPECT_EQ(0u, log.count("copy folder"));
+  for (const auto& [key, value] : service.requests()) EXPECT_NE("ctl.start", key) << value;
   EXPECT_EQ("", property("persist.oem.nfc.debug"));
 }
 
