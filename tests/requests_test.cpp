@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <map>
 
 #include "tests/daemon.h"
 #include "tests/device_root.h"
@@ -88,7 +89,7 @@ TEST_F(Requests, TagsFollowTheirSwitchesAndCommands) {
               {"OEM_NFC_DEBUG_DISABLE", "log.tag.SnepServer", "INFO", 12},
               {"OEM_NFC_DEBUG_ENABLE", "log.tag.SnepServer", "VERBOSE", 12}};
   for (const auto& row : rows) {
-    const size_t earlier = service.requests().size();
+    const auto earlier = static_cast<long>(service.requests().size());
     send_commands({row.command});
     const auto requests = service.requests();
     const std::map<std::string, std::string> set(requests.begin() + earlier, requests.end());
