@@ -15,9 +15,10 @@ struct CopyEnd {
 
 // Appends the content of `from` to `to`, which is created with mode 0644 when missing and given to
 // the system user while the log root lies in the data partition. The source is a regular file, or a
-// FIFO, which is read as far as it can be without waiting; `links` says which links lead to it. The
-// destination is a regular file, and no link leads to it. Any thread. Returns 1 when both could be
-// opened, -1 otherwise (logged); what a read or write error in the middle leaves stays.
+// FIFO, of which what it holds is copied; `links` says which links may lead to it. The destination
+// is a regular file, and no link leads to it; neither has a second name. Any thread. Returns 1 when
+// both could be opened, -1 otherwise (logged); what a read or write error in the middle leaves
+// stays.
 int copy_file(const CopyEnd& from, Links links, const CopyEnd& to);
 
 // The same by paths; links to the source that are the daemon's own user's are followed.
