@@ -14,8 +14,18 @@ TARGETS = {
 }
 OF_SUPPORT = ("tests/CMakeLists.txt", "corvex_test_support")
 
-# The rooms whose code becomes the daemon.
-ROOMS = ["capture", "collect", "connectivity", "core", "early", "fs_mgr", "storage", "thermal"]
+# The modules whose code becomes the daemon.
+MODULES = [
+    "capture",
+    "collect",
+    "connectivity",
+    "core",
+    "early",
+    "fs_mgr",
+    "service",
+    "storage",
+    "thermal",
+]
 
 # A dotted name, but for those that end as a file's do. The code may name the beginning of some.
 PROPERTY = r"[a-z]\w*(?:\.[\w-]+)+"
@@ -64,9 +74,9 @@ def source_problems():
 
 def properties_in_code():
     names = set()
-    for room in ROOMS:
-        for file in sorted(os.listdir(room)):
-            code = re.sub(r"//.*", "", read(os.path.join(room, file)))
+    for module in MODULES:
+        for file in sorted(os.listdir(module)):
+            code = re.sub(r"//.*", "", read(os.path.join(module, file)))
             names |= set(re.findall(r'"(%s\.?)"' % PROPERTY, code))
     return {name for name in names if not re.fullmatch(FILE_NAME, name)}
 

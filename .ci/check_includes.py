@@ -1,38 +1,31 @@
 #!/usr/bin/env python3
-"""Fails when an include points the wrong way between the rooms, or round in a circle."""
+"""Fails when an include points the wrong way between the modules, or round in a circle."""
 
 import os
 import re
 import sys
 
-# The rooms whose headers each room may include, besides its own. A new room gets a row.
-ALLOWED = {
-    "platform": [],
-    "core": [],
-    "fs_mgr": [],
-    "storage": ["core"],
-    "capture": ["core", "storage"],
-    "early": ["core", "storage", "capture"],
-    "collect": ["core", "storage", "capture"],
-    "thermal": ["core", "storage", "capture"],
-    "connectivity": ["core", "storage", "capture"],
-    "client": [],
-    "simulator": [],
-}
+# The picture of the modules: each line of it includes only headers of the lines below.
+PICTURE = "docs/architecture.md"
+
+# These share no code with the daemon.
+APART = ["client", "platform", "simulator"]
 
 # These look at whatever they try out.
-OUTSIDE = ["tests", "fuzz", "bench", "faults"]
-
-# What of core sits on top of the rooms: it may look into each of them, and none of them at it.
-TOP = ["core/main", "core/startup", "core/control_socket", "core/commands"]
+OUTSIDE = ["tests", "tools"]
 
 
-def room(path):
+def read_levels():
+    """The level of each module in the picture; 0 is the top."""
+    with open(PICTURE, encoding="utf-8") as file:
+        picture = re.search(r"^```text\n(.*?)^```", file.read(), re.M | re.S).group(1)
+    lines = [re.match(r"(\w+/ +)+", line) for line in picture.splitlines()]
+    rows = [re.findall(r"\w+", line.group()) for line in lines if line]
+    return {name: level for level, row in enumerate(rows) for name in row}
+
+
+def module(path):
     return path.split("/")[0]
-
-
-def is_top(path):
-    return os.path.splitext(path)[0] in TOP
 
 
 def read_includes():
@@ -51,17 +44,16 @@ def read_includes():
     return includes
 
 
-def wrong_way(path, target):
+def wrong_way(path, target, levels):
     """Why `path` may not include `target`, or None."""
     if not os.path.exists(target):
         return "is not named from the top of the tree"
-    if room(path) in OUTSIDE or is_top(path):
+    above, below = module(path), module(target)
+    if above in OUTSIDE or above == below:
         return None
-    if is_top(target):
-        return "sits above it"
-    if room(target) != room(path) and room(target) not in ALLOWED[room(path)]:
-        return "is in a room that %s/ may not include" % room(path)
-    return None
+    if above in levels and below in levels and levels[above] < levels[below]:
+        return None
+    return "is in a module that %s/ may not include" % above
 
 
 def find_cycle(includes):
@@ -90,16 +82,16 @@ def find_cycle(includes):
 def main():
     os.chdir(os.path.join(os.path.dirname(os.path.abspath(__file__)), ".."))
     includes = read_includes()
+    levels = read_levels()
     problems = [
-        "%s: has no row in .ci/check_includes.py" % name
-        for name in sorted({room(path) for path in includes} - set(ALLOWED) - set(OUTSIDE))
+        "%s/: stands neither in the picture in %s nor in .ci/check_includes.py" % (name, PICTURE)
+        for name in sorted({module(path) for path in includes} - {*levels, *APART, *OUTSIDE})
     ]
-    if not problems:
-        for path, targets in includes.items():
-            for target in targets:
-                reason = wrong_way(path, target)
-                if reason:
-                    problems.append('%s: "%s" %s' % (path, target, reason))
+    for path, targets in includes.items():
+        for target in targets:
+            reason = wrong_way(path, target, levels)
+            if reason:
+                problems.append('%s: "%s" %s' % (path, target, reason))
     cycle = find_cycle(includes)
     if cycle:
         problems.append("includes go in a circle: " + " -> ".join(cycle))

@@ -4,7 +4,7 @@
 import re
 import sys
 
-TRUTH = "core/commands.cpp"
+TRUTH = "service/commands.cpp"
 ROW = r'^    \{"([A-Z_]+)",'
 # Where else each word stands, and how.
 LISTED = {

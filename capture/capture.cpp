@@ -2,11 +2,10 @@
 
 #include <unistd.h>
 
-#include "capture/capture_state.h"
 #include "capture/children.h"
 #include "capture/exec_shell.h"
 #include "capture/recorders.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 #include "core/thread.h"
 #include "storage/capture_paths.h"
 #include "storage/earlier_logs.h"
@@ -30,12 +29,12 @@ void run_recorder(const void* argument) {
 
 // The two switches of the android recorder were read before the properties were dumped; every other
 // one counts as it stands when its turn comes.
-bool starts(const Recorder& recorder, const CaptureSwitches& switches) {
+bool should_start(const Recorder& recorder, const CaptureSwitches& switches) {
   if (recorder.slot == &android_pid) return switches.main || switches.system;
   return switched_on(recorder.switches[0]);
 }
 
-bool stops(const Recorder& recorder) {
+bool should_stop(const Recorder& recorder) {
   bool on = false;
   for (const char* property : recorder.switches) {
     if (property != nullptr && switched_on(property)) on = true;
@@ -58,7 +57,7 @@ void begin_capture() {
 }
 
 void executeLogcat() {
-  handle_ended_children();
+  install_sigchld_handler();
   const CaptureSwitches switches = {switched_on("persist.sys.main"),
                                     switched_on("persist.sys.system"),
                                     switched_on("persist.sys.kernel.kmsg")};
@@ -66,11 +65,11 @@ void executeLogcat() {
   start_thread(copy_file_already_exist);
   exec_shell("getprop", "getprop.txt");
   for (const Recorder& recorder : kRecorders) {
-    if (!starts(recorder, switches)) continue;
+    if (!should_start(recorder, switches)) continue;
     RecorderStart start = {&recorder, &switches};
     start_child(*recorder.slot, run_recorder, &start);
   }
-  pause_seconds(kSettlingTime);
+  sleep_seconds(kSettlingTime);
   stop_logcat = 0;
 }
 
@@ -78,7 +77,7 @@ void stopLogcat() {
   stop_logcat = 1;
   capture_running = 0;
   for (const Recorder& recorder : kRecorders) {
-    if (!stops(recorder)) continue;
+    if (!should_stop(recorder)) continue;
     for (int32_t* descriptor : recorder.descriptors) close_slot(descriptor);
     terminate_child(*recorder.slot);
     forget_child(*recorder.slot);

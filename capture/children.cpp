@@ -8,7 +8,7 @@
 
 #include <atomic>
 
-#include "capture/capture_state.h"
+#include "capture/recorders.h"
 #include "core/local_time.h"
 #include "core/log.h"
 
@@ -33,7 +33,7 @@ namespace {
 std::atomic_flag slots_locked = ATOMIC_FLAG_INIT;
 ChildSlot* known_slots = nullptr;
 bool starting = false;
-int deferred_deliveries = 0;
+int pending_deliveries = 0;
 
 class SlotLock {
  public:
@@ -66,9 +66,9 @@ void begin_start(ChildSlot& slot) {
 }
 
 // Another thread's handler may have held the lock at the fork; it does not exist in the child.
-void free_lock_in_child() {
+void reset_after_fork() {
   starting = false;
-  deferred_deliveries = 0;
+  pending_deliveries = 0;
   slots_locked.clear(std::memory_order_release);
 }
 
@@ -78,9 +78,9 @@ int end_start(ChildSlot& slot, pid_t result) {
   slot.pid = result;
   slot.running = result > 0;
   starting = false;
-  int deferred = deferred_deliveries;
-  deferred_deliveries = 0;
-  return deferred;
+  int pending = pending_deliveries;
+  pending_deliveries = 0;
+  return pending;
 }
 
 void mark_ended(ChildSlot& slot, int status) {
@@ -92,7 +92,7 @@ void mark_ended(ChildSlot& slot, int status) {
 bool reap_one(pid_t* reaped) {
   SlotLock lock;
   if (starting) {
-    ++deferred_deliveries;
+    ++pending_deliveries;
     return false;
   }
   int status;
@@ -104,7 +104,7 @@ bool reap_one(pid_t* reaped) {
   return true;
 }
 
-void deliver() {
+void on_sigchld() {
   pid_t reaped = 0;
   if (!reap_one(&reaped)) return;
   log_error("corvexd: stop_logcat : %d, pid = %d\n", stop_logcat.load(), reaped);
@@ -112,7 +112,7 @@ void deliver() {
 
 // Ends that came together were delivered as one, and each delivery reaps one child. Without this
 // the rest would pile up, capture after capture.
-void deliver_what_was_merged() {
+void reap_merged_ends() {
   siginfo_t ended = {};
   while (waitid(P_ALL, 0, &ended, WEXITED | WNOHANG | WNOWAIT) == 0 && ended.si_pid != 0) {
     sig_chld_handler(SIGCHLD);
@@ -124,19 +124,19 @@ void deliver_what_was_merged() {
 
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument) {
   local_time_mutex.lock();
-  deliver_what_was_merged();
+  reap_merged_ends();
   begin_start(slot);
   pid_t result = fork();
   int error = errno;
   if (result == 0) {
-    free_lock_in_child();
+    reset_after_fork();
     local_time_mutex.unlock();
     body(argument);
     _exit(1);
   }
-  int deferred = end_start(slot, result);
+  int pending = end_start(slot, result);
   local_time_mutex.unlock();
-  for (; deferred > 0; --deferred) deliver();
+  for (; pending > 0; --pending) on_sigchld();
   errno = error;
 }
 
@@ -172,11 +172,11 @@ void sig_chld_handler(int signal) {
   log_debug("corvexd: in function %s\n", __func__);
   if (signal == SIGCHLD) {
     log_debug("corvexd: in function %s, and receive signal %d\n", __func__, signal);
-    deliver();
+    on_sigchld();
   }
   errno = saved_errno;
 }
 
-void handle_ended_children() { signal(SIGCHLD, sig_chld_handler); }
+void install_sigchld_handler() { signal(SIGCHLD, sig_chld_handler); }
 
 }  // namespace corvexd

@@ -43,6 +43,6 @@ void forget_child(ChildSlot& slot);
 void sig_chld_handler(int signal);
 
 // Installs sig_chld_handler. Every starter does so before its first child.
-void handle_ended_children();
+void install_sigchld_handler();
 
 }  // namespace corvexd

@@ -10,9 +10,9 @@
 #include <utility>
 
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 #include "core/state.h"
 
 using android::base::unique_fd;
@@ -56,7 +56,7 @@ bool start_shell(ChildSlot& slot, const char* command, unique_fd output) {
 void exec_shell(const char* command, const char* name) {
   const Path output = Path(LOG_DIR.get()).append("/").append(name);
   if (!output.fits_or_log()) return;
-  PathBuffer<512> line, started;
+  FixedString<512> line, started;
   line.append(command).append(" > ").append(output.c_str());
   started.append(command);
   if (isInDataPartition) {
@@ -70,7 +70,7 @@ void exec_shell(const char* command, const char* name) {
   // What the line says, but that the file is opened and given away here.
   unique_fd file = open_program_output(output.c_str());
   if (file != -1) give_to_system(file);
-  if (start_shell(dump_slot, started.c_str(), std::move(file))) pause_seconds(kHeadStart);
+  if (start_shell(dump_slot, started.c_str(), std::move(file))) sleep_seconds(kHeadStart);
   log_info("corvexd: shell_cmd is %s \n", line.c_str());
 }
 

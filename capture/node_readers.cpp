@@ -1,8 +1,8 @@
 // The table of the daemon's own readers.
 #include <stdlib.h>
 
-#include "capture/capture_state.h"
 #include "capture/node_reader.h"
+#include "capture/recorders.h"
 #include "core/settings.h"
 #include "storage/capture_paths.h"
 

@@ -4,13 +4,13 @@
 #include <stdio.h>
 
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 
 namespace corvexd {
 namespace {
 
-using SeriesName = PathBuffer<kPathSize + 12>;  // a name, "." and any int
+using SeriesName = FixedString<kPathSize + 12>;  // a name, "." and any int
 
 SeriesName series_name(const char* name, int suffix) {
   SeriesName text;

@@ -9,9 +9,9 @@
 
 #include "core/directory.h"
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/local_time.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 #include "core/state.h"
 #include "storage/copy.h"
 #include "storage/current_directory.h"

@@ -11,9 +11,9 @@
 #include "capture/children.h"
 #include "capture/exec_shell.h"
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/local_time.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 #include "storage/current_directory.h"
 
 using android::base::unique_fd;
@@ -67,7 +67,7 @@ void getBugreport() {
 void cacheClear() { run_and_wait(clear_slot, run_clear, nullptr, "Clear"); }
 
 const char* otherLogsCommand(const char* command, const char* kind, char* file_name) {
-  static PathBuffer<200> line;
+  static FixedString<200> line;
   Path directory;
   if (!find_current_directory(WhichMark::kFirstPlain, &directory)) {
     log_error("corvexd: no current log directory for %s\n", command);

@@ -16,8 +16,8 @@
 #include "core/files.h"
 #include "core/local_time.h"
 #include "core/log.h"
-#include "core/pause.h"
 #include "core/properties.h"
+#include "core/sleep.h"
 #include "core/state.h"
 #include "storage/copy.h"
 #include "storage/current_directory.h"
@@ -96,7 +96,7 @@ unique_fd open_anr_directory(LongPath* path) {
 
 void complete_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
-  if (*state.anr_directory.c_str() == '\0') return;
+  if (state.anr_directory.empty()) return;
   const unique_fd traces = open_folder(kTraces);
   const unique_fd folder = open_anr_directory(&state.anr_directory);
   LongPath source, target(state.anr_directory);
@@ -115,7 +115,7 @@ void dump_input(int folder, const LongPath& directory) {
   constexpr char kFile[] = "dumpsys_input";
   const LongPath command = LongPath().append(kDump).append("&");
   unique_fd output = open_program_output_at(folder, kFile);
-  if (start_shell(input_dump, command.c_str(), std::move(output))) pause_seconds(1);
+  if (start_shell(input_dump, command.c_str(), std::move(output))) sleep_seconds(1);
   LongPath line;
   line.append(kDump).append(" > ").append(directory.c_str()).append(kFile).append("&");
   log_info("corvexd: anr_input is %s \n", line.c_str());
@@ -124,7 +124,7 @@ void dump_input(int folder, const LongPath& directory) {
 void begin_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
   // Before the first capture there is no log directory, and nothing is to be made elsewhere.
-  if (*LOG_DIR.get().c_str() == '\0') return;
+  if (LOG_DIR.get().empty()) return;
   LongPath directory;
   unique_fd folder;
   {
@@ -168,7 +168,7 @@ void handle_event(ObserverState& state, uint32_t mask, const char* name) {
   if ((mask & IN_CLOSE_WRITE) != 0) handle_closed(state, name);
   if ((mask & IN_CREATE) != 0) handle_created(state, name);
   if ((mask & (IN_MODIFY | IN_CREATE)) != 0 && holds(name, "raw")) {
-    pause_seconds(1);
+    sleep_seconds(1);
     property_set("debug.sf.dump", "0");
     movefile("/data/misc/display/", name);
   }

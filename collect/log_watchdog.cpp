@@ -5,9 +5,9 @@
 #include <time.h>
 #include <unistd.h>
 
-#include "capture/capture_state.h"
+#include "capture/recorders.h"
 #include "core/log.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 #include "storage/capture_paths.h"
 
 namespace corvexd {
@@ -34,7 +34,7 @@ void check_log() {
 void* log_file_observer(void*) {
   while (capture_running) {
     check_log();
-    pause_seconds(kCheckPeriod);
+    sleep_seconds(kCheckPeriod);
   }
   return nullptr;
 }

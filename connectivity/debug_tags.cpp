@@ -3,8 +3,8 @@
 #include <cutils/properties.h>
 #include <stdlib.h>
 
-#include "core/pause.h"
 #include "core/properties.h"
+#include "core/sleep.h"
 
 namespace corvexd {
 namespace {
@@ -128,7 +128,7 @@ void set_connectivit_android_log() {
 void* connectivity_log_check(void*) {
   for (int pass = 0; pass < kPasses; ++pass) {
     set_connectivit_android_log();
-    pause_seconds(kPassPeriod);
+    sleep_seconds(kPassPeriod);
   }
   return nullptr;
 }

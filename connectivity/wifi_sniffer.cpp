@@ -3,7 +3,7 @@
 #include <unistd.h>
 
 #include "core/log.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 
 namespace corvexd {
 
@@ -42,7 +42,7 @@ constexpr Job kStopJob = {&sniff_stop_pid,
 
 void run_job(const void* argument) {
   const auto& job = *static_cast<const Job*>(argument);
-  if (job.delay > 0) pause_seconds(job.delay);
+  if (job.delay > 0) sleep_seconds(job.delay);
   bool in_vendor = access(job.vendor_tool, F_OK) == 0;
   exec_program(in_vendor ? job.vendor_tool : job.system_tool, job.arguments);
 }
@@ -51,7 +51,7 @@ void start_job(const Job& job) {
   terminate_child(*job.slot);
   forget_child(*job.slot);
   start_child(*job.slot, run_job, &job);
-  if (job.delay > 0) pause_seconds(job.delay);
+  if (job.delay > 0) sleep_seconds(job.delay);
 }
 
 }  // namespace

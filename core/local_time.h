@@ -5,11 +5,11 @@
 
 #include <mutex>
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 
 namespace corvexd {
 
-using Timestamp = PathBuffer<100>;
+using Timestamp = FixedString<100>;
 
 // The current local time, and the same as "%Y-%m-%d-%H-%M-%S". Any thread; in a child started by
 // start_child too.

@@ -5,7 +5,7 @@
 
 #include <atomic>
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 
 namespace corvexd {
 

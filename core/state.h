@@ -1,11 +1,11 @@
-// Where logs are written: the process-wide location state that every room reads.
+// Where logs are written: the process-wide location state that every module reads.
 #pragma once
 
 #include <stdint.h>
 
 #include <atomic>
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 #include "core/published_path.h"
 
 namespace corvexd {

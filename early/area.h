@@ -1,7 +1,7 @@
 // The areas of the cache log directory that the early recorders write into.
 #pragma once
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 
 namespace corvexd {
 

@@ -8,12 +8,12 @@
 
 #include <initializer_list>
 
-#include "capture/logcat_vector.h"
+#include "capture/logcat_argv.h"
 #include "core/directory.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
-#include "core/pause.h"
 #include "core/properties.h"
+#include "core/sleep.h"
 #include "core/state.h"
 #include "early/area.h"
 #include "storage/copy.h"
@@ -88,7 +88,7 @@ void renameOldBootLog(const char* path) {
 }
 
 void executeOnBootLogcat() {
-  handle_ended_children();
+  install_sigchld_handler();
   provide_area(kArea);
   for (const char* file : kOldFiles) renameOldBootLog(cache_file(file).c_str());
   log_error("corvexd: executeOnBootLogcat start \n");
@@ -100,7 +100,7 @@ void executeOnBootLogcat() {
 void* stopLogAfterBoot(void*) {
   const bool persistent_capture = property_is("persist.sys.assert.panic", "true");
   const Path area = cache_file(kArea);
-  pause_seconds(kRecordedTime);
+  sleep_seconds(kRecordedTime);
   for (ChildSlot* slot : {&android_boot_pid, &event_boot_pid, &kernel_boot_pid, &radio_boot_pid}) {
     terminate_child(*slot);
   }

@@ -6,11 +6,11 @@
 #include <unistd.h>
 
 #include "capture/children.h"
-#include "capture/logcat_vector.h"
+#include "capture/logcat_argv.h"
 #include "core/directory.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 #include "core/thread.h"
 #include "early/area.h"
 
@@ -82,7 +82,7 @@ uint32_t size_below(const Directory& directory) {
 }  // namespace
 
 void execute911Logcat() {
-  handle_ended_children();
+  install_sigchld_handler();
   if (access(cache_file(kMarker).c_str(), R_OK) == 0) return;
   property_set("oem.after.clear", "false");
   start_thread(delete_file);
@@ -98,7 +98,7 @@ void* delete_file(void*) {
   for (;;) {
     while (getDirSize(area.c_str()) > kSizeLimit && deleteFile()) {
     }
-    pause_seconds(kCheckPeriod);
+    sleep_seconds(kCheckPeriod);
   }
 }
 

@@ -8,8 +8,8 @@
 
 #include "core/directory.h"
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 #include "core/state.h"
 #include "storage/current_directory.h"
 

@@ -3,7 +3,7 @@
 
 #include <mutex>
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 
 namespace corvexd {
 

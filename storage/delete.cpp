@@ -9,8 +9,8 @@
 #include <utility>
 
 #include "core/directory.h"
+#include "core/fixed_string.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 
 namespace corvexd {
 namespace {
@@ -24,7 +24,7 @@ bool remove_entries(const Directory& directory, const char* path) {
   bool all = true;
   bool ends_in_slash = *path != '\0' && path[strlen(path) - 1] == '/';
   while (struct dirent* entry = next_entry(directory)) {
-    PathBuffer<kRemovalPathSize> child;
+    FixedString<kRemovalPathSize> child;
     child.append(path).append(ends_in_slash ? "" : "/").append(entry->d_name);
     bool removed = child.fits_or_log() &&
                    remove_entry(dirfd(directory.get()), entry->d_name, child.c_str()) == 0;

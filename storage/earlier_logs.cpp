@@ -1,6 +1,6 @@
 #include "storage/earlier_logs.h"
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 #include "core/state.h"
 #include "storage/copy.h"
 

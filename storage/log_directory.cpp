@@ -9,11 +9,11 @@
 #include <unistd.h>
 
 #include "core/directory.h"
-#include "core/end.h"
+#include "core/exit.h"
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/local_time.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
 #include "core/state.h"
 #include "storage/copy.h"
 #include "storage/current_directory.h"
@@ -74,7 +74,7 @@ Path next_log_directory() {
   const unique_fd folder = open_folder_at(place.folder, place.name);
   unlinkat(folder, kVersionFile, 0);
   unlinkat(place.folder, place.name, AT_REMOVEDIR);
-  end_daemon();
+  exit_daemon();
 }
 
 // Opens the version file of the log directory and writes the build's name, a property value with

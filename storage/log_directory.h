@@ -1,7 +1,7 @@
 // The numbered log directories under the log root.
 #pragma once
 
-#include "core/path_buffer.h"
+#include "core/fixed_string.h"
 
 namespace corvexd {
 

@@ -13,9 +13,9 @@
 #include <thread>
 
 #include "capture/children.h"
-#include "core/path_buffer.h"
-#include "core/pause.h"
+#include "core/fixed_string.h"
 #include "core/published_path.h"
+#include "core/sleep.h"
 #include "tests/files.h"
 
 namespace corvexd::test {
@@ -28,7 +28,7 @@ constexpr bool kSanitized = false;
 #endif
 
 TEST(Anywhere, PathBufferKnowsWhatDidNotFit) {
-  PathBuffer<8> buffer;
+  FixedString<8> buffer;
   EXPECT_TRUE(buffer.append("1234").append("567").fits());
   EXPECT_FALSE(buffer.append("8").fits());
   EXPECT_STREQ("1234567", buffer.c_str());
@@ -102,14 +102,14 @@ TEST(Anywhere, PauseLastsThoughSignalsInterruptIt) {
   const struct itimerval often = {{0, 1000}, {0, 1000}}, never = {};
   setitimer(ITIMER_REAL, &often, nullptr);
   const auto start = std::chrono::steady_clock::now();
-  pause_seconds(1);
+  sleep_seconds(1);
   EXPECT_GE(std::chrono::steady_clock::now() - start, std::chrono::seconds(1));
   setitimer(ITIMER_REAL, &never, nullptr);
 }
 
 TEST(Anywhere, AChildThatEndsAtOnceIsFoundInItsSlot) {
   static ChildSlot slot;
-  handle_ended_children();
+  install_sigchld_handler();
   for (int i = 0; i < 300; ++i) {
     start_child(
         slot, [](const void*) {}, nullptr);

@@ -76,7 +76,7 @@ bool is_running(pid_t pid) {
 }
 
 TEST_F(Children, NoSignalReachesARecycledNumber) {
-  handle_ended_children();
+  install_sigchld_handler();
   start_child(slots[0], end_at_once, nullptr);
   const pid_t number = slots[0].pid;
   ASSERT_TRUE(log.has("corvexd: stop_logcat : 1, pid = " + std::to_string(number) + "\n"));
@@ -90,7 +90,7 @@ TEST_F(Children, NoSignalReachesARecycledNumber) {
   kill(bystander, SIGKILL);
   waitpid(bystander, nullptr, 0);
 
-  handle_ended_children();
+  install_sigchld_handler();
   start_child(slots[0], live, nullptr);
   terminate_child(slots[0]);
   EXPECT_TRUE(log.has("corvexd: stop_logcat : 1, pid = " + std::to_string(slots[0].pid) + "\n"));
@@ -104,7 +104,7 @@ TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
   // A handler that interrupts an allocation waits for the log's reader, who allocates as well here.
   log.stop();
   ASSERT_NE(nullptr, freopen("/dev/null", "w", stderr));
-  handle_ended_children();
+  install_sigchld_handler();
   std::atomic<bool> done{false};
   ChildSlot stubborn;
   start_child(stubborn, live_on, nullptr);
@@ -172,7 +172,7 @@ void look_at_fork() {
 }
 
 TEST_F(Children, NobodyIsInsideTheTimeZoneAtAFork) {
-  handle_ended_children();
+  install_sigchld_handler();
   ASSERT_EQ(0, pthread_atfork(look_at_fork, nullptr, nullptr));
   looks_at_forks = true;
   start_child(slots[0], end_at_once, nullptr);

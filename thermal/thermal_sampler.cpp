@@ -8,10 +8,10 @@
 #include <unistd.h>
 
 #include "core/files.h"
+#include "core/fixed_string.h"
 #include "core/local_time.h"
 #include "core/log.h"
-#include "core/path_buffer.h"
-#include "core/pause.h"
+#include "core/sleep.h"
 #include "storage/log_directory.h"
 #include "storage/mkdirs.h"
 
@@ -55,7 +55,7 @@ constexpr Source kSources[] = {
     {"msm_therm", "/sys/class/thermal/thermal_zone16/temp", "        "},
 };
 
-using Line = PathBuffer<4096>;
+using Line = FixedString<4096>;
 
 void append_value(Line& line, const Source& source) {
   char field[kFieldSize] = {};
@@ -101,7 +101,7 @@ void run_sampler(const void* path) {
 ChildSlot cpu_thermal_pid;
 
 int getCpuxThermal() {
-  handle_ended_children();
+  install_sigchld_handler();
   Path path = provide_current_directory();
   if (!path.append(kSubdirectory).fits_or_log()) return -1;
   log_info("corvexd: cpu&thermal log path is %s \n", path.c_str());
@@ -117,7 +117,7 @@ void record_cpux_thermal(const char* path, int /*value*/) {
                                         start.tm_mday, start.tm_hour, start.tm_min, start.tm_sec);
   for (;;) {
     if (file.fits()) append_line(file.c_str(), sample());
-    pause_seconds(kPeriod);
+    sleep_seconds(kPeriod);
   }
 }
 

@@ -5,7 +5,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/init/property_store.h"
 
 using android::base::unique_fd;

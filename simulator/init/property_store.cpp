@@ -7,7 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 
 namespace corvexd::sim {
 namespace {

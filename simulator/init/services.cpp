@@ -11,7 +11,7 @@
 #include <time.h>
 #include <unistd.h>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 
 using android::base::unique_fd;
 

@@ -5,7 +5,7 @@
 
 #include <algorithm>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 
 namespace corvexd::sim {
 namespace {

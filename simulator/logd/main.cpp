@@ -5,7 +5,7 @@
 #include <string.h>
 #include <sys/socket.h>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/logd/log_store.h"
 #include "simulator/logd/readers.h"
 

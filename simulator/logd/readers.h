@@ -6,7 +6,7 @@
 
 #include <vector>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/logd/log_store.h"
 
 namespace corvexd::sim {

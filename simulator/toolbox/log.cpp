@@ -11,7 +11,7 @@
 
 #include <string>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/toolbox/tools.h"
 
 namespace corvexd::sim {

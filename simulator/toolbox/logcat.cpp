@@ -10,7 +10,7 @@
 
 #include <string>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/toolbox/kernel_log.h"
 #include "simulator/toolbox/logcat_options.h"
 #include "simulator/toolbox/output.h"

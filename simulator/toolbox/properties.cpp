@@ -7,7 +7,7 @@
 #include <map>
 #include <string>
 
-#include "simulator/common/contract.h"
+#include "simulator/common/protocol.h"
 #include "simulator/toolbox/tools.h"
 
 namespace corvexd::sim {

@@ -1,0 +1,386 @@
+#include "tools/faults/life.h"
+
+#include <errno.h>
+#include <fcntl.h>
+#include <stdlib.h>
+#include <sys/socket.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <memory>
+#include <set>
+#include <thread>
+
+#include "tests/daemon.h"
+#include "tests/device_root.h"
+#include "tests/files.h"
+#include "tests/log_catcher.h"
+#include "tests/property_service.h"
+
+namespace corvexd::faults {
+namespace {
+
+using namespace test;  // NOLINT(google-build-using-namespace): the device and its helpers
+
+constexpr char kTombstones[] = "LOGS/TIME/tombstones/TIME/";  // as achievements
+constexpr char kTraceFolder[] = "LOGS/TIME/anr/TIME/";
+constexpr char kOldFile[] = "/data/corvex/KVBR_1--2020-01-01-00-00-00/old";
+constexpr int kWindow = 40'000;     // microseconds in which the daemon is watched for being busy
+constexpr long kBusy = 12'000'000;  // nanoseconds of processor time in a window
+constexpr size_t kWatches = 9;
+constexpr long kTenYears = 315'360'000;
+constexpr int kDisturbances = 6;  // of one life
+
+bool may_be_set(const std::string& key, const std::string& value) {
+  static const std::set<std::pair<std::string, std::string>> rows = {
+      {"persist.oem.nfc.debug", "1"}, {"oem.after.clear", "false"},
+      {"debug.sf.dump", "0"},         {"ctl.start", "diag_mdlog_start"},
+      {"ctl.restart", "logd"},        {"ctl.restart", "logd-reinit"},
+      {"ctl.restart", "corvexd"}};
+  bool is_level = value == "VERBOSE" || value == "INFO";
+  return rows.count({key, value}) != 0 || (is_level && key.rfind("log.tag.", 0) == 0);
+}
+
+// Ten years ahead of UTC, which shows in the names: a zone's file with one offset and no change.
+std::string far_zone() {
+  std::string file = "TZif" + std::string(40, '\0');
+  file[39] = 1;  // one kind of time
+  file[43] = 4;  // characters of names
+  return file + std::string("\x12\xcc\x03\x00\0\0FAR\0", 10);
+}
+
+bool is_in_that_zone(const std::string& directory) {
+  const time_t there = time(nullptr) + kTenYears;
+  const std::string year = std::to_string(gmtime(&there)->tm_year + 1900);
+  return directory.find("--" + year) != std::string::npos;
+}
+
+void write_to(int fd, const std::string& text) {
+  if (write(fd, text.data(), text.size()) != static_cast<ssize_t>(text.size())) _exit(1);
+}
+
+bool has_come(const std::string& achievement) {
+  usleep(10'000);
+  Achievements achieved;
+  count_logs(read_logs(), achieved);
+  return achieved.count(achievement) != 0;
+}
+
+// A client: never waits for ever.
+class Client {
+ public:
+  // A start may wait for ever for what can never be opened; a client who may give up then sends
+  // nothing more.
+  Client(TracedDaemon& daemon, std::vector<std::string>& problems, bool may_give_up)
+      : daemon_(daemon), problems_(problems), may_give_up_(may_give_up) {}
+
+  // Sends the command over a connection of its own and returns what came back until the daemon
+  // ended it.
+  std::string send(const std::string& command) {
+    int fd = gave_up_ ? -1 : connect_while_it_lives();
+    if (fd == -1) return "";
+    const std::string bytes = message(command);
+    ::send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+    shutdown(fd, SHUT_WR);
+    std::string reply;
+    bool ended = wait_until([&] {
+      char buffer[64];
+      ssize_t count = recv(fd, buffer, sizeof buffer, MSG_DONTWAIT);
+      if (count > 0) reply.append(buffer, count);
+      // Children of a daemon that was killed keep its connections open.
+      return count == -1 && errno == EAGAIN ? daemon_.has_ended() : count <= 0;
+    });
+    if (!ended) problems_.push_back("hangs at " + command);
+    close(fd);
+    return reply;
+  }
+
+ private:
+  int connect_while_it_lives() {
+    int fd = -1;
+    bool settled = wait_until([&] { return (fd = try_to_connect()) != -1 || daemon_.has_ended(); },
+                              may_give_up_ ? kPatience / 4 : kPatience);
+    gave_up_ = !settled && may_give_up_;
+    if (!settled && !may_give_up_) problems_.emplace_back("does not serve");
+    return fd;
+  }
+
+  TracedDaemon& daemon_;
+  std::vector<std::string>& problems_;
+  bool may_give_up_;
+  bool gave_up_ = false;
+};
+
+// While one thread of the daemon is kept from going on, has others of it do something: an artefact
+// and a trace arrive, and a command.
+class Disturber {
+ public:
+  explicit Disturber(TracedDaemon& daemon) : daemon_(daemon), client_(daemon, problems_, false) {
+    thread_ = std::thread([this] { run(); });
+  }
+
+  ~Disturber() {
+    done_ = true;
+    thread_.join();
+  }
+
+  // Ends when the disturbance in hand is over. Each artefact that came is an achievement then, or a
+  // problem.
+  void finish(Life& life) {
+    done_ = true;
+    while (!finished_) usleep(1000);
+    for (const std::string& wanted : wanted_) {
+      if (!wait_until([&] { return has_come(wanted); }))
+        life.problems.push_back("loses what arrived meanwhile: " + wanted);
+    }
+    life.problems.insert(life.problems.end(), problems_.begin(), problems_.end());
+  }
+
+ private:
+  void run() {
+    for (char number = 'a'; number < 'a' + kDisturbances && !done_; ++number) {
+      while (!done_ && !daemon_.stands_still()) usleep(1000);
+      if (done_) break;
+      disturb(number);
+      while (daemon_.stands_still()) usleep(1000);
+    }
+    finished_ = true;
+  }
+
+  void disturb(char number) {
+    const std::string tombstone = std::string("tombstone_late_") + number;
+    const std::string trace = std::string("anr_late_") + number;
+    int fd = open(("/data/anr/" + trace).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
+    write_to(fd, kArtefactStart);
+    write_file("/data/tombstones/" + tombstone, kArtefactStart + kArtefactEnd);
+    client_.send("LOGBEGIN");
+    write_to(fd, kArtefactEnd);
+    close(fd);
+    wanted_.push_back(kTombstones + tombstone + " whole");
+    wanted_.push_back(kTraceFolder + trace + " whole");
+  }
+
+  TracedDaemon& daemon_;
+  std::vector<std::string> problems_, wanted_;
+  Client client_;
+  std::atomic<bool> done_{false}, finished_{false};
+  std::thread thread_;
+};
+
+class Story {
+ public:
+  Story(const Fault* fault, const std::string& traced, Life& life, Files& outside)
+      : mode_(fault == nullptr ? Mode::kFail : fault->mode),
+        life_(life),
+        outside_(outside),
+        daemon_(std::make_unique<TracedDaemon>(fault, traced)),
+        client_(*daemon_, life.problems, fault != nullptr && fault->lasting) {}
+
+  void tell() {
+    for (const char* node : {"/nodes/kmsg", "/nodes/qsee_log", "/nodes/tz_log"}) {
+      nodes_.push_back(open(node, O_RDWR | O_CLOEXEC));
+    }
+    client_.send("CHANGEPATH");  // carried out once the start and its capture are behind it
+    wait_for([&] { return watches(); });
+    until_delete();
+    after_delete();
+    settle();
+    life_.calls = daemon_->let_go();
+    for (int fd : nodes_) close(fd);
+    look_after_it();
+  }
+
+ private:
+  void until_delete() {
+    const std::unique_ptr<Disturber> disturber = disturb();
+    feed_nodes();
+    make_artefacts();
+    int trace = open("/data/anr/anr_open", O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
+    write_to(trace, kArtefactStart);
+    send_all({"CACHECLEAR", "BUGREPORT", "WIFI_SNIFFLOG_START", "OEM_GPS_DEBUG_ENABLE",
+              "OEM_BT_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE", "LOGSTOP"});
+    settle();
+    write_file("/etc/localtime", far_zone());
+    send_all({"LOGBEGIN"});
+    write_to(trace, kArtefactEnd);
+    close(trace);
+    look_at("/data/anr/anr_open", outside_);
+    send_all({"CPUTHERMAL", "WIFI_SNIFFLOG_STOP", "WIFI_SNIFFLOG_START"});
+    feed_nodes();
+    finish_artefacts("tombstone_last");
+    send_all({"STOPCPUTHERMAL", "LOGSTOP"});
+    if (disturber) disturber->finish(life_);
+    see_what_was_achieved();
+  }
+
+  // The thermal record is then the first to need a log directory.
+  void after_delete() {
+    const std::unique_ptr<Disturber> disturber = disturb();
+    known_.clear();
+    ++life_.achieved["deletion answered " + client_.send("DELETELOG")];
+    if (read_logs().count(kOldFile) == 0) ++life_.achieved["what was deleted is gone"];
+    send_all({"CPUTHERMAL"});
+    finish_artefacts("tombstone_after");
+    send_all({"STOPCPUTHERMAL"});
+    see_what_was_achieved();
+  }
+
+  void feed_nodes() {
+    const std::string block(2500, 'k');
+    for (int node : nodes_) write_to(node, block);
+  }
+
+  void make_artefacts() {
+    for (const char* path :
+         {"/data/tombstones/tombstone_00", "/data/anr/anr_1", "/data/anr/BATTERY_html.gz",
+          "/data/media/0/Pictures/Screenshots/Screenshot_1", "/data/coredump/core.1",
+          "/data/misc/display/raw_1", "/data/vendor/media/yuv_1", "/data/anr/anr_1"}) {
+      make_artefact(path);
+    }
+    make_artefact("/data/system/entry");
+    outside_.erase("/data/system/entry");
+    rename("/data/system/entry", "/data/system/dropbox/entry");
+    look_at("/data/system/dropbox/entry", outside_);
+  }
+
+  void make_artefact(const std::string& path) {
+    write_file(path, kArtefactStart + kArtefactEnd);
+    look_at(path, outside_);
+  }
+
+  // Waits until the last artefact and the thermal record are there, if they ever are.
+  void finish_artefacts(const std::string& tombstone) {
+    make_artefact("/data/tombstones/" + tombstone);
+    for (const std::string& wanted : {kTombstones + tombstone + " whole",
+                                      std::string("LOGS/TIME/kv_tsen_data/#_# not empty")}) {
+      wait_for([&] { return has_come(wanted); });
+    }
+    settle();
+  }
+
+  void send_all(const std::vector<const char*>& commands) {
+    for (const char* command : commands) {
+      check_known(read_logs());
+      client_.send(command);
+    }
+  }
+
+  // No log directory is lost but by deletion.
+  void check_known(const Files& logs) {
+    for (const std::string& path : known_) {
+      // A listing may miss what is renamed meanwhile.
+      if (logs.count(path) != 0 || read_logs().count(path) != 0) continue;
+      life_.problems.push_back("loses the directory " + path);
+    }
+    known_.clear();
+    for (const auto& [path, content] : logs) {
+      if (std::count(path.begin(), path.end(), '/') == 4 && path.back() == '/') known_.insert(path);
+    }
+  }
+
+  void see_what_was_achieved() {
+    const Files logs = read_logs();
+    check_known(logs);
+    count_logs(logs, life_.achieved);
+    if (marked_directories().size() == 1) ++life_.achieved["one mark"];
+    for (const std::string& path : known_) {
+      if (is_in_that_zone(path)) ++life_.achieved["a name in the new zone"];
+    }
+  }
+
+  // Null unless it is delayed.
+  std::unique_ptr<Disturber> disturb() {
+    return mode_ == Mode::kDelay ? std::make_unique<Disturber>(*daemon_) : nullptr;
+  }
+
+  // Waits for what may never be when calls fail.
+  template <typename Done>
+  void wait_for(const Done& done) {
+    wait_until([&] { return done() || daemon_->has_ended(); },
+               mode_ == Mode::kFail ? 1 : kPatience);
+  }
+
+  bool watches() {
+    std::string facts;
+    const std::string folder = "/proc/" + std::to_string(daemon_->pid()) + "/fdinfo/";
+    for (const std::string& fd : list(folder)) facts += read_file(folder + fd);
+    size_t count = 0;
+    for (size_t at = 0; (at = facts.find("inotify wd:", at)) != std::string::npos; ++at) ++count;
+    return count == kWatches;
+  }
+
+  // Waits until it has nothing more to do. The tracer alone can make a sampler look busy.
+  bool settle() {
+    return wait_until([&] {
+      if (mode_ == Mode::kDelay && daemon_->stands_still()) return false;
+      const long before = daemon_->processor_time();
+      usleep(kWindow);
+      return daemon_->processor_time() - before < kBusy;
+    });
+  }
+
+  // Untraced and undisturbed it carries out commands, if need be after init has started it again.
+  void look_after_it() {
+    bool starts_again = daemon_->has_ended() || mode_ == Mode::kKill;
+    if (daemon_->has_ended()) life_.status = daemon_->status();
+    if (starts_again) daemon_->end();  // its children too
+    const Files before = read_logs();
+    if (starts_again) daemon_ = std::make_unique<TracedDaemon>(nullptr, "");
+    Client client(*daemon_, life_.problems, false);
+    if (starts_again) client.send("CHANGEPATH");
+    client.send("LOGBEGIN");
+    const Files after = read_logs();
+    check_known(after);
+    for (const auto& [path, content] : before) {
+      auto found = after.find(path);
+      if (!starts_again || (found != after.end() && found->second == content)) continue;
+      life_.problems.push_back("started again, it changes or loses " + path);
+    }
+    const std::vector<std::string> marked = marked_directories();
+    if (marked.size() != 1) {
+      life_.problems.push_back(std::to_string(marked.size()) + " directories bear the mark");
+    } else if (read_file(marked[0] + "/versionNumber").size() != 92) {
+      life_.problems.emplace_back("does not begin a capture any more");
+    }
+    client.send("LOGSTOP");
+    if (client.send("DELETELOG") != "CLEANSUCCESS") {
+      life_.problems.emplace_back("does not delete logs any more");
+    }
+    if (!settle()) life_.problems.emplace_back("is busy without end");
+  }
+
+  const Mode mode_;
+  Life& life_;
+  Files& outside_;  // what was made for it to find is added
+  std::unique_ptr<TracedDaemon> daemon_;
+  Client client_;
+  std::vector<int> nodes_;
+  std::set<std::string> known_;  // log directories
+};
+
+}  // namespace
+
+Life live(const Fault* fault, const std::string& traced) {
+  Life life;
+  make_device();
+  LogCatcher log;
+  log.start();
+  PropertyService service;
+  Files before, after;
+  look_at("/", before);
+  Story(fault, traced, life, before).tell();
+  look_at("/", after);
+  compare(before, after, life.problems);
+  for (const auto& [key, value] : service.requests()) {
+    // A request without a value was cut short by the end of the daemon.
+    if (*value.c_str() != '\0' && !may_be_set(key, value))
+      life.problems.push_back("sets " + key + " to " + value);
+  }
+  if (!partition_is_sound()) life.problems.emplace_back("the partition is neither log nor zeros");
+  life.log = log.texts();
+  return life;
+}
+
+}  // namespace corvexd::faults
