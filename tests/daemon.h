@@ -32,10 +32,10 @@ class Daemon : public BootingDaemon {
 // Lets a start go through without waiting.
 void make_device_ready();
 
-// Makes /nodes, each file in it holding its own name, and a program that is the daemon with those
-// for the kernel's and the firmware's: its /proc is theirs, in which only `self` is real.
+// Makes /nodes, each file in it holding its own name, and a program that is the given daemon with
+// those for the kernel's and the firmware's: its /proc is theirs, in which only `self` is real.
 extern const char* const kDaemonWithNodes;
-void make_nodes();
+void make_nodes(const std::string& daemon = "/build/tests/corvexd_fast");
 
 // How often a pause of that many seconds has begun.
 size_t pauses(int seconds);

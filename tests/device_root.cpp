@@ -1,10 +1,12 @@
 #include "tests/device_root.h"
 
+#include <fcntl.h>
 #include <sched.h>
 #include <signal.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -53,7 +55,10 @@ void make_root(const std::string& root) {
   }
   write_file(root + "/etc/passwd", "root:x:0:0::/:/bin/sh\nsystem:x:1000:1000::/:/bin/sh\n");
   write_file(root + "/etc/group", "root:x:0:\nsystem:x:1000:\n");
-  check(chroot(root.c_str()) == 0 && chdir("/") == 0, "chroot");
+  // The root of all mounts, so that a path reads the same from every mount namespace made in it.
+  check(chdir(root.c_str()) == 0 && syscall(SYS_pivot_root, ".", ".") == 0 &&
+            umount2(".", MNT_DETACH) == 0 && chdir("/") == 0,
+        "pivot_root");
 }
 
 // Waits for every child that is left to this process; returns the status of `pid`.
@@ -71,12 +76,13 @@ void enter_device_root() {
   entered_as_root = uid == 0;
   char root[] = "/tmp/corvex-test-XXXXXX";
   check(mkdtemp(root) != nullptr, root);
+  const int old_root = open("/", O_PATH | O_CLOEXEC);
   check(unshare(CLONE_NEWNS | CLONE_NEWPID | (entered_as_root ? 0 : CLONE_NEWUSER)) == 0,
         "unshare");
   if (!entered_as_root) map_to_root(uid, gid);
   if (pid_t init = fork(); init != 0) {
     int status = wait_for_all(init);
-    rmdir(root);
+    unlinkat(old_root, root + 1, AT_REMOVEDIR);
     _exit(status);
   }
   prctl(PR_SET_PDEATHSIG, SIGKILL);

@@ -32,9 +32,12 @@ PropertyService::~PropertyService() {
 
 void PropertyService::serve() {
   for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
+    // A child that was forked in the middle of a request keeps the connection when it has failed.
+    const struct timeval patience = {2, 0};
+    setsockopt(client, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
     uint32_t command = 0;
     if (recv(client, &command, sizeof command, MSG_WAITALL) != sizeof command) {
-      close(client);  // its daemon was killed before it had asked
+      close(client);  // its daemon was ended before it had asked
       continue;
     }
     EXPECT_EQ(0x00020001u, command);

@@ -2,13 +2,13 @@
 
 #include <stdio.h>
 #include <string.h>
-#include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <regex>
 
+#include "tests/daemon.h"
 #include "tests/files.h"
 
 namespace corvexd::faults {
@@ -21,13 +21,13 @@ constexpr char kMark[] = "_current";
 constexpr const char* kRoots[] = {"/data/corvex", "/storage/emulated/0/corvex"};
 
 constexpr char kDevice[] = R"sh(
-rm -rf /data /cache /storage /system /vendor /probe /trace /nodes /dev/socket /dev/block \
+rm -rf /data /cache /storage /system /vendor /probe /trace /dev/socket /dev/block \
   /dev/__properties__ /etc/localtime
 mkdir -p /data/corvex/KVBR_1--2020-01-01-00-00-00_current /data/tombstones /data/anr \
   /data/system/dropbox /data/misc/display /data/media/0/Pictures/Screenshots /data/coredump \
   /data/vendor/media /storage/emulated/0/corvex/earlier /system/bin /system/xbin /vendor/bin \
   /vendor/etc /cache/boot_log /cache/log_before_initial /cache/recovery /cache/lkmsg /trace \
-  /nodes /dev/socket /dev/__properties__ ${1%/*}
+  /probe /dev/socket /dev/__properties__ ${1%/*}
 cd /dev/__properties__
 for name in main system radio event kernel kernel.kmsg tcpdump qsee tz bootloader pre_bootloader \
   qxdm; do
@@ -37,10 +37,6 @@ printf true > persist.sys.assert.panic
 printf 1 > vold.internalSD.mount
 printf 1 > persist.sys.kernel.logsize
 printf 3 > /data/.layout_version
-mkfifo /nodes/kmsg /nodes/qsee_log /nodes/tz_log
-for name in proc_transactions proc_transaction_log proc_state bootloader_log; do
-  echo $name > /nodes/$name
-done
 head -c 40960 /dev/zero | tr '\0' r > $1
 for file in /cache/boot_log/android_boot.log /cache/boot_log/kernel_boot.log.1 \
   /cache/recovery/last_log /cache/lkmsg/lkmsg \
@@ -72,10 +68,9 @@ chmod 755 /system/bin/* /system/xbin/* /vendor/bin/*
 constexpr const char* kNotWatched[] = {"/usr",
                                        "/build",
                                        "/proc",
-                                       "/daemon_proc",
                                        "/real_proc",
-                                       kJail,
-                                       kTraces,
+
+                                       "/trace",
                                        "/probe",
                                        "/nodes",
                                        "/dev/socket",
@@ -117,27 +112,11 @@ void note(const std::string& path, bool all, Files& files) {
 const std::string kArtefactStart(2500, 'a');
 const std::string kArtefactEnd = "end of the artefact";
 
-void prepare_root() {
-  umount2("/dev/kmsg", MNT_DETACH);
-  unlink("/dev/kmsg");
-  run("ln -s /nodes/kmsg /dev/kmsg; mkdir -p /jail /real_proc /daemon_proc/tzdbg; cd /daemon_proc; "
-      "ln -s /real_proc/self self; ln -s /nodes/qsee_log /nodes/tz_log tzdbg; ln -s "
-      "/nodes/bootloader_log /nodes/proc_transactions /nodes/proc_transaction_log "
-      "/nodes/proc_state .; echo quiet > cmdline");
-  if (mount("proc", "/real_proc", "proc", 0, nullptr) != 0 ||
-      mount("/", kJail, nullptr, MS_BIND | MS_REC, nullptr) != 0 ||
-      // The tracer's unwinder looks from the daemon's root for the names that it sees from its own.
-      mount("/", "/jail/jail", nullptr, MS_BIND | MS_REC, nullptr) != 0 ||
-      mount("/daemon_proc", "/jail/proc", nullptr, MS_BIND, nullptr) != 0) {
-    perror("mount");
-    _exit(1);
-  }
-}
-
 void make_device() {
   test::write_file("/device.sh", kDevice);
   run(std::string("sh /device.sh ") + kPartition);
   unlink("/device.sh");
+  test::make_nodes(kProgram);
 }
 
 // Its first 32 KiB are zeroed, block after block; the rest is nobody's business.

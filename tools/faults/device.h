@@ -8,15 +8,10 @@
 namespace corvexd::faults {
 
 constexpr char kProgram[] = "/build/tools/faults/corvexd_gated";
-// The daemon's root is the device's once more, but with firmware nodes in its /proc. The tracer,
-// which needs the true one, sees the daemon's files below this.
-constexpr char kJail[] = "/jail";
 constexpr char kTraces[] = "/trace";
 
-// Makes the calling process's device root ready for lives.
-void prepare_root();
-
-// Makes the device one on which everything that the daemon does is due.
+// Makes the device in the calling process's root one on which everything that the daemon does is
+// due.
 void make_device();
 
 // Whether of the reserved partition no more than its log has become zeros.

@@ -2,7 +2,7 @@
 //
 // The tracer counts calls separately for each thread and child, and disturbs "the Nth call" of
 // every one of them. So that a fault can be meant for the main thread alone or for all others, the
-// main thread first makes kShieldCalls vain calls of that kind: its own calls come after that
+// main thread first makes kReservedCalls idle calls of that kind: its own calls come after that
 // number, and nobody else makes as many. The signal that kills is ignored meanwhile.
 #include <errno.h>
 #include <signal.h>
@@ -16,21 +16,21 @@ namespace {
 
 __attribute__((constructor)) void wait_at_gate() {
   raise(SIGSTOP);
-  const char* number = getenv(corvexd::faults::kShieldVariable);
+  const char* number = getenv(corvexd::faults::kReservedVariable);
   if (number == nullptr) return;
   signal(corvexd::faults::kKillingSignal, SIG_IGN);
-  for (int i = 0; i < corvexd::faults::kShieldCalls; ++i) {
+  for (int i = 0; i < corvexd::faults::kReservedCalls; ++i) {
     syscall(strtol(number, nullptr, 10), -1, -1, -1, -1, -1, -1);  // fails whatever it is
   }
   signal(corvexd::faults::kKillingSignal, SIG_DFL);
-  unsetenv(corvexd::faults::kShieldVariable);
+  unsetenv(corvexd::faults::kReservedVariable);
 }
 
 }  // namespace
 
 namespace corvexd {
 
-// A hundredth of every pause; a minute is longer than a traced start and shorter than a life.
+// A hundredth of every time; a minute is longer than a traced start and shorter than a run.
 void sleep_seconds(time_t seconds) {
   long milliseconds = seconds < 60 ? seconds * 10 : seconds * 18;
   struct timespec left = {milliseconds / 1000, milliseconds % 1000 * 1'000'000};

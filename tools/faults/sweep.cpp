@@ -1,7 +1,6 @@
-// Lives the daemon's life again and again, and each time another of its system calls fails, is its
-// last, or takes long.
+// Runs the daemon again and again, and each time another of its system calls fails, is its last, or
+// takes long.
 #include <stdio.h>
-#include <stdlib.h>
 #include <string.h>
 #include <sys/mman.h>
 #include <sys/syscall.h>
@@ -16,19 +15,15 @@
 #include <set>
 
 #include "tests/device_root.h"
-#include "tools/faults/life.h"
-#include "tools/faults/verdict.h"
+#include "tools/faults/oracle.h"
+#include "tools/faults/scenario.h"
 
 namespace corvexd::faults {
 namespace {
 
-constexpr int kWorkers = 4;      // a life sleeps as much as it works
-constexpr int kTries = 3;        // of a life that went wrong; twice the same is no chance
-constexpr int kNormalLives = 4;  // tell what all lives without faults have in common
-
-constexpr size_t kMaxPlan = 8000;
-constexpr char kKill[] = "signal=USR2";  // kKillingSignal
-constexpr char kDelay[] = "delay_enter=300000";
+constexpr size_t kWorkers = 4;  // a run sleeps as much as it works
+constexpr int kTries = 3;       // of a run that went wrong; twice the same is no chance
+constexpr int kNormalRuns = 3;  // tell what all runs without faults have in common
 constexpr const char* kModes[] = {"fail", "kill", "delay"};  // as the enumeration has them
 
 struct Row {
@@ -76,76 +71,74 @@ const std::vector<Row> kRows = {
 };
 
 // What is to be done: all, unless the command line says less.
-struct Wish {
+struct Options {
   bool modes[3] = {true, true, true};
   std::string call;
-  size_t first = 1, step = 1;  // every `step`th site, beginning with this one
+  size_t first = 1, step = 1;  // of every `step` faults, this one
 };
-
-using Place = std::pair<const Row*, Call>;
-
-// Every chain of callers that makes a call in a fault-free life sees its first such call disturbed,
-// for the main thread and for all others apart.
-std::vector<Place> find_places(const Life& life) {
-  std::vector<Place> places;
-  for (const Row& row : kRows) {
-    std::set<std::string> chains;
-    std::set<std::pair<bool, int>> known;
-    for (const Call& call : life.calls) {
-      if (call.name != row.call || call.callers.empty() || !chains.insert(call.site).second)
-        continue;
-      if (known.insert({call.in_main, call.when}).second) places.emplace_back(&row, call);
-    }
-  }
-  return places;
-}
 
 // What the workers share.
-struct Shared {
-  std::atomic<size_t> next, lives, disturbed, problems;
-  size_t planned, normal_size;
-  struct {
-    Fault fault;
-    char where[500];
-  } plan[kMaxPlan];
-  char normal[1 << 20];
+struct Counters {
+  std::atomic<size_t> planned, runs, disturbed, problems;
 };
 
-void make_plan(const std::vector<Place>& places, const Wish& wish, Shared& shared) {
-  for (Mode mode : {Mode::kFail, Mode::kKill, Mode::kDelay}) {
-    if (!wish.modes[static_cast<int>(mode)]) continue;
-    for (size_t i = wish.first - 1; i < places.size(); i += wish.step) {
-      const auto& [row, call] = places[i];
-      if (!wish.call.empty() && wish.call != row->call) continue;
-      std::vector<const char*> outcomes = row->errors;
-      if (mode == Mode::kFail && row->lasting != nullptr) outcomes.push_back(row->lasting);
-      if (mode == Mode::kKill) outcomes = {kKill};
-      if (mode == Mode::kDelay) outcomes = {kDelay};
-      for (size_t k = 0; k < outcomes.size(); ++k) {
-        bool lasting = mode == Mode::kFail && k == row->errors.size();
-        auto& entry = shared.plan[shared.planned++];
-        entry.fault = {mode, row->call, row->number, outcomes[k], lasting, call.in_main, call.when};
-        snprintf(entry.where, sizeof entry.where, "%s", call.callers.c_str());
+struct PlannedFault {
+  Fault fault;
+  std::string callers;  // of the call
+};
+
+std::string describe(const Fault& fault) {
+  return std::string(fault.call) + ":" + fault.outcome + (fault.lasting ? "+" : "") + " call " +
+         std::to_string(fault.when) + " of " + (fault.in_main ? "the main thread" : "the others");
+}
+
+std::vector<Fault> faults_at(const Row& row, const Call& call) {
+  const Fault base = {Mode::kFail, row.call, row.number, nullptr, false, call.in_main, call.when};
+  std::vector<Fault> faults;
+  auto add = [&](Mode mode, const char* outcome, bool lasting) {
+    faults.push_back(base);
+    faults.back().mode = mode;
+    faults.back().outcome = outcome;
+    faults.back().lasting = lasting;
+  };
+  for (const char* error : row.errors) add(Mode::kFail, error, false);
+  if (row.lasting != nullptr) add(Mode::kFail, row.lasting, true);
+  add(Mode::kKill, "signal=USR2", false);  // kKillingSignal
+  add(Mode::kDelay, "delay_enter=300000", false);
+  return faults;
+}
+
+// Which worker's a fault is does not depend on the order in which threads got ahead in this run.
+bool is_wanted(const Fault& fault, const Options& options, size_t worker) {
+  const size_t number = std::hash<std::string>()(describe(fault));
+  return options.modes[static_cast<int>(fault.mode)] &&
+         number % options.step == options.first - 1 && number / options.step % kWorkers == worker;
+}
+
+// Every chain of callers that makes a call in a run without faults sees its first such call
+// disturbed, for the main thread and for all others apart.
+std::vector<PlannedFault> make_plan(const Run& run, const Options& options, size_t worker) {
+  std::vector<PlannedFault> plan;
+  for (const Row& row : kRows) {
+    if (!options.call.empty() && options.call != row.call) continue;
+    std::set<std::string> chains;
+    std::set<std::pair<bool, int>> known;
+    for (const Call& call : run.calls) {
+      if (call.name != row.call || call.callers.empty()) continue;
+      if (!chains.insert(call.site).second || !known.insert({call.in_main, call.when}).second)
+        continue;
+      for (const Fault& fault : faults_at(row, call)) {
+        if (is_wanted(fault, options, worker)) plan.push_back({fault, call.callers});
       }
     }
   }
+  return plan;
 }
 
 std::string traced_calls() {
   std::string all;
   for (const Row& row : kRows) all += std::string(all.empty() ? "" : ",") + row.call;
   return all;
-}
-
-// Runs `body` in a process with a device root of its own.
-template <typename Body>
-void start_worker(const Body& body) {
-  fflush(stdout);
-  if (fork() != 0) return;
-  test::enter_device_root();
-  prepare_root();
-  body();
-  _exit(0);
 }
 
 // One write, so that the workers' lines do not mix; on a terminal, over the progress.
@@ -157,100 +150,88 @@ void say(const std::string& text) {
   (void)ignored;
 }
 
-void plan(const Wish& wish, Shared& shared) {
-  Normal normal;
-  for (int i = 0; i < kNormalLives; ++i) {
-    // Unhurried by the tracer, too.
-    Life life = live(nullptr, i == 0 ? traced_calls() : "");
-    add_to_normal(life, i == 0, normal);
-    judge(nullptr, normal, life);
-    shared.problems += life.problems.size();
-    for (const std::string& problem : life.problems) say("WRONG: no fault: " + problem);
-    if (i == 0) make_plan(find_places(life), wish, shared);
-  }
-  const std::string text = write_normal(normal);
-  shared.normal_size = text.copy(shared.normal, sizeof shared.normal);
-}
-
-// A life that goes wrong is repeated: what is wrong again is a finding, what is not is told apart.
-bool try_fault(const Fault& fault, const char* where, const Normal& normal, Shared& shared) {
+// A run that goes wrong is repeated: what is wrong again is a finding, what is not is told apart.
+void try_fault(const PlannedFault& planned, const Normal& normal, Counters& counters) {
   static const std::regex time("[0-9]{4}(-[0-9]{2}){5}");
   std::map<std::string, int> seen;
-  bool disturbed = false;
+  bool disturbed = false, wrong = false;
   for (int i = 0; i < kTries && (i == 0 || !seen.empty()); ++i) {
-    Life life = live(&fault, "");
-    judge(&fault, normal, life);
-    disturbed = disturbed || !life.calls.empty() || life.status != -1;
+    Run run = run_scenario(&planned.fault, "");
+    judge(&planned.fault, normal, run);
+    disturbed = disturbed || !run.calls.empty() || run.status != -1;
     std::set<std::string> problems;
-    for (const std::string& text : life.problems)
+    for (const std::string& text : run.problems)
       problems.insert(std::regex_replace(text, time, "TIME"));
     for (const std::string& problem : problems) ++seen[problem];
   }
-  const std::string place = std::string(fault.call) + ":" + fault.outcome +
-                            (fault.lasting ? "+" : "") + " call " + std::to_string(fault.when) +
-                            " of " + (fault.in_main ? "the main thread" : "the others") + " in " +
-                            where;
-  bool sound = true;
   for (const auto& [problem, times] : seen) {
-    say((times > 1 ? "WRONG: " : "once in three: ") + place + ": " + problem);
-    sound = sound && times == 1;
+    say((times > 1 ? "WRONG: " : "once in three: ") + describe(planned.fault) + " in " +
+        planned.callers + ": " + problem);
+    wrong = wrong || times > 1;
   }
-  shared.disturbed += disturbed;
-  return sound;
+  counters.disturbed += disturbed;
+  counters.problems += wrong;
+  ++counters.runs;
 }
 
-// Until the last worker has ended.
-void show_progress(const Shared& shared) {
+// In a device root of its own.
+void work(const Options& options, size_t worker, Counters& counters) {
+  test::enter_device_root();
+  Normal normal;
+  std::vector<PlannedFault> plan;
+  for (int i = 0; i < kNormalRuns; ++i) {
+    // Unhurried by the tracer, too.
+    Run run = run_scenario(nullptr, i == 0 ? traced_calls() : "");
+    if (i == 0) plan = make_plan(run, options, worker);
+    add_to_normal(run, i == 0, normal);
+    judge(nullptr, normal, run);
+    counters.problems += run.problems.size();
+    for (const std::string& problem : run.problems) say("WRONG: no fault: " + problem);
+  }
+  counters.planned += plan.size();
+  for (const PlannedFault& planned : plan) try_fault(planned, normal, counters);
+}
+
+int sweep(const Options& options) {
   const time_t start = time(nullptr);
-  while (waitpid(-1, nullptr, WNOHANG) != -1) {
-    if (isatty(STDOUT_FILENO)) {
-      printf("\r%zu of %zu lives, %lld s, %zu wrong", shared.lives.load(), shared.planned,
-             static_cast<long long>(time(nullptr) - start), shared.problems.load());
-      fflush(stdout);
-    }
-    usleep(200'000);
+  auto& counters = *static_cast<Counters*>(
+      mmap(nullptr, sizeof(Counters), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
+  auto show = [&] {
+    printf("%zu of %zu runs in %lld s, %zu of them disturbed, %zu wrong", counters.runs.load(),
+           counters.planned.load(), static_cast<long long>(time(nullptr) - start),
+           counters.disturbed.load(), counters.problems.load());
+    fflush(stdout);
+  };
+  for (size_t worker = 0; worker < kWorkers; ++worker) {
+    if (fork() != 0) continue;
+    work(options, worker, counters);
+    _exit(0);
   }
-  printf("%s%zu of %zu lives in %lld s, %zu of them disturbed, %zu wrong\n",
-         isatty(STDOUT_FILENO) ? "\r\033[K" : "", shared.lives.load(), shared.planned,
-         static_cast<long long>(time(nullptr) - start), shared.disturbed.load(),
-         shared.problems.load());
-}
-
-int sweep(const Wish& wish) {
-  auto& shared = *static_cast<Shared*>(
-      mmap(nullptr, sizeof(Shared), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
-  start_worker([&] { plan(wish, shared); });
-  while (wait(nullptr) > 0) {
+  bool all_ended_well = true;
+  for (int ended, status; (ended = waitpid(-1, &status, WNOHANG)) != -1; usleep(200'000)) {
+    if (ended > 0) all_ended_well = all_ended_well && status == 0;
+    if (!isatty(STDOUT_FILENO)) continue;
+    printf("\r");
+    show();
   }
-  if (shared.planned == 0) {
-    fprintf(stderr, "a life without faults has no such call\n");
-    return 1;
-  }
-  const Normal normal = read_normal({shared.normal, shared.normal_size});
-  for (int i = 0; i < kWorkers; ++i) {
-    start_worker([&] {
-      for (size_t turn; (turn = shared.next++) < shared.planned; ++shared.lives) {
-        const auto& [fault, where] = shared.plan[turn];
-        if (!try_fault(fault, where, normal, shared)) ++shared.problems;
-      }
-    });
-  }
-  show_progress(shared);
-  return shared.problems == 0 && shared.lives == shared.planned ? 0 : 1;
+  show();
+  printf("\n");
+  if (counters.planned == 0) fprintf(stderr, "a run without faults has no such call\n");
+  return all_ended_well && counters.problems == 0 && counters.planned != 0 ? 0 : 1;
 }
 
 // False for what cannot be understood.
-bool read_wish(int argc, char** argv, Wish& wish) {
+bool read_options(int argc, char** argv, Options& options) {
   for (int i = 1; i < argc; ++i) {
     const std::string word = argv[i];
     const auto* mode = std::find(std::begin(kModes), std::end(kModes), word);
     if (word == "--slice") {
-      bool good = ++i < argc && sscanf(argv[i], "%zu/%zu", &wish.first, &wish.step) == 2;
-      if (!good || wish.first < 1 || wish.first > wish.step) return false;
+      bool good = ++i < argc && sscanf(argv[i], "%zu/%zu", &options.first, &options.step) == 2;
+      if (!good || options.first < 1 || options.first > options.step) return false;
     } else if (mode != std::end(kModes)) {
-      for (size_t k = 0; k < 3; ++k) wish.modes[k] = kModes[k] == word;
-    } else if (wish.call.empty() && word[0] != '-') {
-      wish.call = word;
+      for (size_t k = 0; k < 3; ++k) options.modes[k] = kModes[k] == word;
+    } else if (options.call.empty() && word[0] != '-') {
+      options.call = word;
     } else {
       return false;
     }
@@ -262,10 +243,10 @@ bool read_wish(int argc, char** argv, Wish& wish) {
 }  // namespace corvexd::faults
 
 int main(int argc, char** argv) {
-  corvexd::faults::Wish wish;
-  if (!corvexd::faults::read_wish(argc, argv, wish)) {
+  corvexd::faults::Options options;
+  if (!corvexd::faults::read_options(argc, argv, options)) {
     fprintf(stderr, "usage: ./dev faults [fail|kill|delay] [CALL] [--slice N/M]\n");
     return 2;
   }
-  return corvexd::faults::sweep(wish);
+  return corvexd::faults::sweep(options);
 }

@@ -10,9 +10,9 @@
 #include <algorithm>
 #include <fstream>
 #include <map>
-#include <set>
-#include <vector>
+#include <regex>
 
+#include "tests/daemon.h"
 #include "tests/files.h"
 #include "tools/faults/device.h"
 
@@ -21,68 +21,46 @@ namespace {
 
 using test::list, test::read_file;
 
-constexpr char kTracer[] = "/usr/bin/strace";
-constexpr int kLooks = 8;  // a stop for each call is over long before as many
+constexpr int kLooks = 5;  // a stop for each call is over long before as many
 constexpr int kLookPeriod = 10'000;
+constexpr char kGone = 'X';
 
 void use_null_for_standard_streams() {
   int null = open("/dev/null", O_RDWR | O_CLOEXEC);
   for (int fd : {0, 1, 2}) dup2(null, fd);
 }
 
-pid_t start_program(const std::vector<std::string>& arguments) {
-  pid_t pid = fork();
-  if (pid != 0) return pid;
-  use_null_for_standard_streams();
-  std::vector<char*> vector;
-  for (const std::string& text : arguments) vector.push_back(const_cast<char*>(text.c_str()));
-  vector.push_back(nullptr);
-  execv(vector[0], vector.data());
-  _exit(127);
-}
-
 [[noreturn]] void run(int fd) {
   setsid();
-  if (chroot(kJail) != 0 || chdir("/") != 0) _exit(126);
   use_null_for_standard_streams();
   fcntl(fd, F_SETFD, 0);
   close_range(3, fd - 1, 0);
   close_range(fd + 1, ~0u, 0);
   setenv("PATH", "/system/bin:/bin", 1);
   unsetenv("TZ");
-  execl(kProgram, kProgram, nullptr);
+  execl(test::kDaemonWithNodes, test::kDaemonWithNodes, nullptr);
   _exit(127);
 }
 
-// Of a "stat" file: its third field, and its sixth.
-void read_state(const std::string& file, char* state, pid_t* session) {
-  const std::string text = read_file(file);
-  *state = 'X';
-  *session = -1;
+// The state of the process or thread that a folder of /proc tells of.
+char state_of(const std::string& folder) {
+  const std::string text = read_file(folder + "/stat");
   const size_t name_end = text.rfind(") ");
-  if (name_end == std::string::npos) return;
-  sscanf(text.c_str() + name_end + 2, "%c %*d %*d %d", state, session);
+  return name_end == std::string::npos ? kGone : text[name_end + 2];
 }
 
-std::vector<std::string> tracer_arguments(const Fault* fault, const std::string& traced) {
+std::string tracer_command(const Fault* fault, const std::string& traced, pid_t pid) {
   // Programs that the daemon executes are let go of; they are not tried out here.
-  std::vector<std::string> arguments = {kTracer, "-ff",         "-b", "execve",
-                                        "-e",    "signal=none", "-o", std::string(kTraces) + "/t"};
+  std::string command = std::string("exec strace -ff -b execve -e signal=none -o ") + kTraces +
+                        "/t -p " + std::to_string(pid);
   // Unwinding each call's stack takes a while; only what fails is of interest.
-  if (fault == nullptr || fault->mode == Mode::kFail) arguments.insert(arguments.end(), {"-k"});
-  if (fault == nullptr) {
-    arguments.insert(arguments.end(), {"-e", "trace=" + traced});
-    return arguments;
-  }
-  std::string when = ":when=" + std::to_string(fault->when + (fault->in_main ? kShieldCalls : 0));
-  if (fault->lasting) when += fault->in_main ? "+" : ".." + std::to_string(kShieldCalls);
-  arguments.insert(arguments.end(),
-                   {"-e", std::string("trace=") + fault->call, "-e",
-                    std::string("inject=") + fault->call + ":" + fault->outcome + when});
-  if (strncmp(fault->outcome, "error=", 6) == 0) {
-    arguments.insert(arguments.end(), {"-e", "status=failed"});
-  }
-  return arguments;
+  if (fault == nullptr || fault->mode == Mode::kFail) command += " -k";
+  if (fault == nullptr) return command + " -e trace=" + traced;
+  std::string when = ":when=" + std::to_string(fault->when + (fault->in_main ? kReservedCalls : 0));
+  if (fault->lasting) when += fault->in_main ? "+" : ".." + std::to_string(kReservedCalls);
+  if (strncmp(fault->outcome, "error=", 6) == 0) command += " -e status=failed";
+  return command + " -e trace=" + fault->call + " -e inject=" + fault->call + ":" + fault->outcome +
+         when;
 }
 
 bool holds(const std::string& text, const char* part) {
@@ -96,13 +74,9 @@ std::string between(const std::string& text, char first, char last) {
 }
 
 // "corvexd::(anonymous namespace)::create(char const*)+0x41" is called create.
-std::string plain_name(std::string function) {
-  for (const char* space : {"(anonymous namespace)::", "corvexd::"}) {
-    for (size_t at; (at = function.find(space)) != std::string::npos;) {
-      function.erase(at, strlen(space));
-    }
-  }
-  return function.substr(0, function.find_first_of("(+"));
+std::string plain_name(const std::string& function) {
+  static const std::regex around("\\(anonymous namespace\\)::|corvexd::|[(+].*");
+  return std::regex_replace(function, around, "");
 }
 
 // Adds the calls of one thread or process. A line for each call, and below it one for each caller.
@@ -123,9 +97,8 @@ void read_trace(const std::string& file, bool in_main, bool disturbed_only,
       calls.back().site += between(line, '[', ']') + " ";
     }
   }
-  // The shield's calls are nobody's.
-  auto is_the_shields = [](const Call& call) { return holds(call.callers, "wait_at_gate"); };
-  calls.erase(std::remove_if(calls.begin(), calls.end(), is_the_shields), calls.end());
+  auto is_the_gates = [](const Call& call) { return holds(call.callers, "wait_at_gate"); };
+  calls.erase(std::remove_if(calls.begin(), calls.end(), is_the_gates), calls.end());
 }
 
 }  // namespace
@@ -134,23 +107,26 @@ TracedDaemon::TracedDaemon(const Fault* fault, const std::string& traced)
     : only_disturbed_(fault != nullptr) {
   int fd = test::bound_socket(SOCK_STREAM, "/dev/socket/corvexd");
   setenv("ANDROID_SOCKET_corvexd", std::to_string(fd).c_str(), 1);
-  if (fault != nullptr) setenv(kShieldVariable, std::to_string(fault->number).c_str(), 1);
+  if (fault != nullptr) setenv(kReservedVariable, std::to_string(fault->number).c_str(), 1);
   pid_ = fork();
   if (pid_ == 0) run(fd);
-  unsetenv(kShieldVariable);
+  unsetenv(kReservedVariable);
   close(fd);
   int status;
   waitpid(pid_, &status, WUNTRACED);
-  if (fault != nullptr || !traced.empty()) attach(fault, traced);
+  if (fault != nullptr || !traced.empty()) attach(tracer_command(fault, traced, pid_));
   kill(pid_, SIGCONT);
 }
 
-void TracedDaemon::attach(const Fault* fault, const std::string& traced) {
-  std::vector<std::string> arguments = tracer_arguments(fault, traced);
-  arguments.insert(arguments.end(), {"-p", std::to_string(pid_)});
-  tracer_ = start_program(arguments);
+void TracedDaemon::attach(const std::string& tracer) {
+  tracer_ = fork();
+  if (tracer_ == 0) {
+    use_null_for_standard_streams();
+    execl("/bin/sh", "sh", "-c", tracer.c_str(), nullptr);
+    _exit(127);
+  }
   const std::string status = "/proc/" + std::to_string(pid_) + "/status";
-  wait_until([&] { return read_file(status).find("TracerPid:\t0") == std::string::npos; });
+  wait_until([&] { return !holds(read_file(status), "TracerPid:\t0"); });
   usleep(3000);
 }
 
@@ -167,46 +143,40 @@ int TracedDaemon::status() const {
   return WIFEXITED(status_) ? WEXITSTATUS(status_) : 128 + WTERMSIG(status_);
 }
 
-void TracedDaemon::for_each_process(const std::function<void(const std::string&)>& visit) const {
+std::vector<pid_t> TracedDaemon::processes() const {
+  std::vector<pid_t> found;
   for (const std::string& name : list("/proc")) {
-    if (atoi(name.c_str()) <= 0) continue;
-    char state;
-    pid_t session;
-    read_state("/proc/" + name + "/stat", &state, &session);
-    if (session == pid_ && state != 'Z') visit("/proc/" + name);
+    const pid_t pid = atoi(name.c_str());
+    if (pid > 0 && getsid(pid) == pid_ && state_of("/proc/" + name) != 'Z') found.push_back(pid);
   }
+  return found;
 }
 
-bool TracedDaemon::stands_still() const {
-  std::set<std::string> still;
-  for (int i = 0; i < kLooks; ++i) {
-    std::set<std::string> stopped;
-    for_each_process([&](const std::string& folder) {
-      for (const std::string& task : list(folder + "/task")) {
-        char state;
-        pid_t session;
-        read_state(folder + "/task/" + task + "/stat", &state, &session);
-        if (state == 't' && (i == 0 || still.count(task) != 0)) stopped.insert(task);
-      }
-    });
-    if (stopped.empty()) return false;
-    still = stopped;
+std::map<std::string, char> TracedDaemon::task_states() const {
+  std::map<std::string, char> states;
+  for (pid_t pid : processes()) {
+    const std::string folder = "/proc/" + std::to_string(pid) + "/task/";
+    for (const std::string& task : list(folder)) states[task] = state_of(folder + task);
+  }
+  return states;
+}
+
+std::map<std::string, bool> TracedDaemon::tasks() const {
+  std::map<std::string, bool> waiting;
+  for (const auto& [task, state] : task_states()) {
+    waiting[task] = state == 'S' || state == 'Z' || state == kGone;
+  }
+  return waiting;
+}
+
+bool TracedDaemon::is_held_up() const {
+  std::map<std::string, int> stopped;
+  for (int look = 0; look < kLooks; ++look) {
+    for (const auto& [task, state] : task_states()) stopped[task] += state == 't';
     usleep(kLookPeriod);
   }
-  return true;
-}
-
-long TracedDaemon::processor_time() const {
-  long total = 0;
-  for_each_process([&](const std::string& folder) {
-    char program[128] = {};
-    if (readlink((folder + "/exe").c_str(), program, sizeof program - 1) == -1) return;
-    if (program != std::string(kJail) + kProgram) return;
-    for (const std::string& task : list(folder + "/task")) {
-      total += atol(read_file(folder + "/task/" + task + "/schedstat").c_str());
-    }
-  });
-  return total;
+  return std::any_of(stopped.begin(), stopped.end(),
+                     [](const auto& row) { return row.second == kLooks; });
 }
 
 std::vector<Call> TracedDaemon::let_go() {
@@ -227,12 +197,8 @@ std::vector<Call> TracedDaemon::let_go() {
 
 void TracedDaemon::kill_all() const {
   // Whoever is forked meanwhile is found the next time round.
-  for (bool any = true; any;) {
-    any = false;
-    for_each_process([&](const std::string& folder) {
-      any = kill(atoi(folder.c_str() + strlen("/proc/")), SIGKILL) == 0 || any;
-    });
-    if (any) usleep(1000);
+  for (std::vector<pid_t> left; !(left = processes()).empty(); usleep(1000)) {
+    for (pid_t pid : left) kill(pid, SIGKILL);
   }
 }
 

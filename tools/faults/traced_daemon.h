@@ -6,16 +6,16 @@
 #include <time.h>
 #include <unistd.h>
 
-#include <functional>
+#include <map>
 #include <mutex>
 #include <string>
 #include <vector>
 
 namespace corvexd::faults {
 
-constexpr char kShieldVariable[] = "CORVEX_SHIELD_CALL";
-constexpr int kShieldCalls = 1000;
-constexpr int kPatience = 60;  // seconds, for what takes milliseconds unless all are busy
+constexpr char kReservedVariable[] = "CORVEX_RESERVED_CALL";
+constexpr int kReservedCalls = 1000;  // the gate makes as many, see there
+constexpr int kPatience = 60;         // seconds, for what takes milliseconds unless all are busy
 
 // Ends who gets it like SIGKILL does, as the daemon leaves it alone; but it can be ignored.
 constexpr int kKillingSignal = SIGUSR2;
@@ -70,10 +70,11 @@ class TracedDaemon {
   int status() const;  // as a shell shows it
 
   // Whether the tracer holds up one of its threads or children for longer than each stop takes.
-  bool stands_still() const;
+  bool is_held_up() const;
 
-  // Nanoseconds of processor time of the daemon and the children that run its code.
-  long processor_time() const;
+  // Its threads and those of its descendants, and whether each waits: for its time, for another, or
+  // for nothing any more.
+  std::map<std::string, bool> tasks() const;
 
   // Takes the tracer away; the daemon goes on. Returns the calls that it wrote down.
   std::vector<Call> let_go();
@@ -83,8 +84,9 @@ class TracedDaemon {
 
  private:
   void kill_all() const;
-  void attach(const Fault* fault, const std::string& traced);
-  void for_each_process(const std::function<void(const std::string& folder)>& visit) const;
+  void attach(const std::string& tracer);
+  std::vector<pid_t> processes() const;
+  std::map<std::string, char> task_states() const;
 
   const bool only_disturbed_;
   pid_t pid_ = 0, tracer_ = 0;

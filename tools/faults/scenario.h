@@ -1,4 +1,4 @@
-// One life of the daemon, from its start on an eventful device to its end, traced and disturbed.
+// One run of the daemon, from its start on an eventful device to its end, with one fault or none.
 #pragma once
 
 #include <string>
@@ -9,15 +9,15 @@
 
 namespace corvexd::faults {
 
-struct Life {
+struct Run {
   std::vector<Call> calls;
   std::vector<std::string> log;
   Achievements achieved;
-  std::vector<std::string> problems;  // what nothing may lead to
+  std::vector<std::string> problems;  // what no fault may lead to
   int status = -1;                    // the daemon ended with it
 };
 
-// Lives one life. With no fault every call named in `traced` is recorded, else what was disturbed.
-Life live(const Fault* fault, const std::string& traced);
+// With no fault every call named in `traced` is recorded, else what was disturbed.
+Run run_scenario(const Fault* fault, const std::string& traced);
 
 }  // namespace corvexd::faults

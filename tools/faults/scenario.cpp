@@ -1,4 +1,4 @@
-#include "tools/faults/life.h"
+#include "tools/faults/scenario.h"
 
 #include <errno.h>
 #include <fcntl.h>
@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <map>
 #include <memory>
 #include <set>
 #include <thread>
@@ -27,11 +28,11 @@ using namespace test;  // NOLINT(google-build-using-namespace): the device and i
 constexpr char kTombstones[] = "LOGS/TIME/tombstones/TIME/";  // as achievements
 constexpr char kTraceFolder[] = "LOGS/TIME/anr/TIME/";
 constexpr char kOldFile[] = "/data/corvex/KVBR_1--2020-01-01-00-00-00/old";
-constexpr int kWindow = 40'000;     // microseconds in which the daemon is watched for being busy
-constexpr long kBusy = 12'000'000;  // nanoseconds of processor time in a window
+constexpr int kWaitingLooks = 3;
+constexpr int kLookPeriod = 10'000;  // microseconds
 constexpr size_t kWatches = 9;
 constexpr long kTenYears = 315'360'000;
-constexpr int kDisturbances = 6;  // of one life
+constexpr int kDisturbances = 6;  // of one run
 
 bool may_be_set(const std::string& key, const std::string& value) {
   static const std::set<std::pair<std::string, std::string>> rows = {
@@ -68,133 +69,109 @@ bool has_come(const std::string& achievement) {
   return achieved.count(achievement) != 0;
 }
 
-// A client: never waits for ever.
+// Never waits for ever. A start may wait for ever for what can never be opened; a client who may
+// give up then sends nothing more.
 class Client {
  public:
-  // A start may wait for ever for what can never be opened; a client who may give up then sends
-  // nothing more.
   Client(TracedDaemon& daemon, std::vector<std::string>& problems, bool may_give_up)
       : daemon_(daemon), problems_(problems), may_give_up_(may_give_up) {}
 
   // Sends the command over a connection of its own and returns what came back until the daemon
   // ended it.
   std::string send(const std::string& command) {
-    int fd = gave_up_ ? -1 : connect_while_it_lives();
-    if (fd == -1) return "";
+    if (gave_up_ || !connect()) return "";
     const std::string bytes = message(command);
-    ::send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-    shutdown(fd, SHUT_WR);
+    ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+    shutdown(fd_, SHUT_WR);
     std::string reply;
     bool ended = wait_until([&] {
       char buffer[64];
-      ssize_t count = recv(fd, buffer, sizeof buffer, MSG_DONTWAIT);
+      ssize_t count = recv(fd_, buffer, sizeof buffer, MSG_DONTWAIT);
       if (count > 0) reply.append(buffer, count);
       // Children of a daemon that was killed keep its connections open.
       return count == -1 && errno == EAGAIN ? daemon_.has_ended() : count <= 0;
     });
     if (!ended) problems_.push_back("hangs at " + command);
-    close(fd);
+    close(fd_);
     return reply;
   }
 
  private:
-  int connect_while_it_lives() {
-    int fd = -1;
-    bool settled = wait_until([&] { return (fd = try_to_connect()) != -1 || daemon_.has_ended(); },
-                              may_give_up_ ? kPatience / 4 : kPatience);
-    gave_up_ = !settled && may_give_up_;
-    if (!settled && !may_give_up_) problems_.emplace_back("does not serve");
-    return fd;
+  bool connect() {
+    gave_up_ = !wait_until([&] { return (fd_ = try_to_connect()) != -1 || daemon_.has_ended(); },
+                           may_give_up_ ? kPatience / 4 : kPatience);
+    if (gave_up_ && !may_give_up_) problems_.emplace_back("does not serve");
+    return fd_ != -1;
   }
 
   TracedDaemon& daemon_;
   std::vector<std::string>& problems_;
-  bool may_give_up_;
+  const bool may_give_up_;
   bool gave_up_ = false;
+  int fd_ = -1;
 };
 
-// While one thread of the daemon is kept from going on, has others of it do something: an artefact
-// and a trace arrive, and a command.
-class Disturber {
+class Scenario {
  public:
-  explicit Disturber(TracedDaemon& daemon) : daemon_(daemon), client_(daemon, problems_, false) {
-    thread_ = std::thread([this] { run(); });
-  }
-
-  ~Disturber() {
-    done_ = true;
-    thread_.join();
-  }
-
-  // Ends when the disturbance in hand is over. Each artefact that came is an achievement then, or a
-  // problem.
-  void finish(Life& life) {
-    done_ = true;
-    while (!finished_) usleep(1000);
-    for (const std::string& wanted : wanted_) {
-      if (!wait_until([&] { return has_come(wanted); }))
-        life.problems.push_back("loses what arrived meanwhile: " + wanted);
-    }
-    life.problems.insert(life.problems.end(), problems_.begin(), problems_.end());
-  }
-
- private:
-  void run() {
-    for (char number = 'a'; number < 'a' + kDisturbances && !done_; ++number) {
-      while (!done_ && !daemon_.stands_still()) usleep(1000);
-      if (done_) break;
-      disturb(number);
-      while (daemon_.stands_still()) usleep(1000);
-    }
-    finished_ = true;
-  }
-
-  void disturb(char number) {
-    const std::string tombstone = std::string("tombstone_late_") + number;
-    const std::string trace = std::string("anr_late_") + number;
-    int fd = open(("/data/anr/" + trace).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
-    write_to(fd, kArtefactStart);
-    write_file("/data/tombstones/" + tombstone, kArtefactStart + kArtefactEnd);
-    client_.send("LOGBEGIN");
-    write_to(fd, kArtefactEnd);
-    close(fd);
-    wanted_.push_back(kTombstones + tombstone + " whole");
-    wanted_.push_back(kTraceFolder + trace + " whole");
-  }
-
-  TracedDaemon& daemon_;
-  std::vector<std::string> problems_, wanted_;
-  Client client_;
-  std::atomic<bool> done_{false}, finished_{false};
-  std::thread thread_;
-};
-
-class Story {
- public:
-  Story(const Fault* fault, const std::string& traced, Life& life, Files& outside)
+  Scenario(const Fault* fault, const std::string& traced, Run& run, Files& outside)
       : mode_(fault == nullptr ? Mode::kFail : fault->mode),
-        life_(life),
+        run_(run),
         outside_(outside),
         daemon_(std::make_unique<TracedDaemon>(fault, traced)),
-        client_(*daemon_, life.problems, fault != nullptr && fault->lasting) {}
+        client_(*daemon_, run.problems, fault != nullptr && fault->lasting) {}
 
-  void tell() {
-    for (const char* node : {"/nodes/kmsg", "/nodes/qsee_log", "/nodes/tz_log"}) {
+  void play() {
+    for (const char* node :
+         {"/nodes/kmsg", "/nodes/proc/tzdbg/qsee_log", "/nodes/proc/tzdbg/tz_log"}) {
       nodes_.push_back(open(node, O_RDWR | O_CLOEXEC));
     }
     client_.send("CHANGEPATH");  // carried out once the start and its capture are behind it
     wait_for([&] { return watches(); });
-    until_delete();
-    after_delete();
+    beside_others(&Scenario::until_delete);
+    beside_others(&Scenario::after_delete);
     settle();
-    life_.calls = daemon_->let_go();
+    run_.calls = daemon_->let_go();
     for (int fd : nodes_) close(fd);
     look_after_it();
   }
 
  private:
+  // Takes steps. While a delay keeps one of the daemon's threads from going on, others have it do
+  // something: an artefact and a trace arrive, and a command.
+  void beside_others(void (Scenario::*steps)()) {
+    std::atomic<bool> done{mode_ != Mode::kDelay};
+    std::vector<std::string> arrived, problems;
+    std::thread others([&] {
+      Client client(*daemon_, problems, false);
+      for (char number = 'a'; number < 'a' + kDisturbances && !done;) {
+        if (daemon_->is_held_up()) disturb(client, number++, arrived);
+      }
+    });
+    (this->*steps)();
+    done = true;
+    others.join();
+    run_.problems.insert(run_.problems.end(), problems.begin(), problems.end());
+    for (const std::string& wanted : arrived) {
+      if (!wait_until([&] { return is_deleted_ || has_come(wanted); }))
+        run_.problems.push_back("loses what arrived meanwhile: " + wanted);
+    }
+    see_what_was_achieved();
+  }
+
+  static void disturb(Client& client, char number, std::vector<std::string>& arrived) {
+    const std::string tombstone = std::string("tombstone_late_") + number;
+    const std::string trace = std::string("anr_late_") + number;
+    int fd = open(("/data/anr/" + trace).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
+    write_to(fd, kArtefactStart);
+    write_file("/data/tombstones/" + tombstone, kArtefactStart + kArtefactEnd);
+    client.send("LOGBEGIN");
+    write_to(fd, kArtefactEnd);
+    close(fd);
+    arrived.push_back(kTombstones + tombstone + " whole");
+    arrived.push_back(kTraceFolder + trace + " whole");
+  }
+
   void until_delete() {
-    const std::unique_ptr<Disturber> disturber = disturb();
     feed_nodes();
     make_artefacts();
     int trace = open("/data/anr/anr_open", O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
@@ -211,20 +188,17 @@ class Story {
     feed_nodes();
     finish_artefacts("tombstone_last");
     send_all({"STOPCPUTHERMAL", "LOGSTOP"});
-    if (disturber) disturber->finish(life_);
-    see_what_was_achieved();
   }
 
   // The thermal record is then the first to need a log directory.
   void after_delete() {
-    const std::unique_ptr<Disturber> disturber = disturb();
     known_.clear();
-    ++life_.achieved["deletion answered " + client_.send("DELETELOG")];
-    if (read_logs().count(kOldFile) == 0) ++life_.achieved["what was deleted is gone"];
+    is_deleted_ = true;
+    ++run_.achieved["deletion answered " + client_.send("DELETELOG")];
+    if (read_logs().count(kOldFile) == 0) ++run_.achieved["what was deleted is gone"];
     send_all({"CPUTHERMAL"});
     finish_artefacts("tombstone_after");
     send_all({"STOPCPUTHERMAL"});
-    see_what_was_achieved();
   }
 
   void feed_nodes() {
@@ -272,7 +246,7 @@ class Story {
     for (const std::string& path : known_) {
       // A listing may miss what is renamed meanwhile.
       if (logs.count(path) != 0 || read_logs().count(path) != 0) continue;
-      life_.problems.push_back("loses the directory " + path);
+      run_.problems.push_back("loses the directory " + path);
     }
     known_.clear();
     for (const auto& [path, content] : logs) {
@@ -283,16 +257,11 @@ class Story {
   void see_what_was_achieved() {
     const Files logs = read_logs();
     check_known(logs);
-    count_logs(logs, life_.achieved);
-    if (marked_directories().size() == 1) ++life_.achieved["one mark"];
+    count_logs(logs, run_.achieved);
+    if (marked_directories().size() == 1) ++run_.achieved["one mark"];
     for (const std::string& path : known_) {
-      if (is_in_that_zone(path)) ++life_.achieved["a name in the new zone"];
+      if (is_in_that_zone(path)) ++run_.achieved["a name in the new zone"];
     }
-  }
-
-  // Null unless it is delayed.
-  std::unique_ptr<Disturber> disturb() {
-    return mode_ == Mode::kDelay ? std::make_unique<Disturber>(*daemon_) : nullptr;
   }
 
   // Waits for what may never be when calls fail.
@@ -311,24 +280,28 @@ class Story {
     return count == kWatches;
   }
 
-  // Waits until it has nothing more to do. The tracer alone can make a sampler look busy.
+  // Waits until each of its threads has been seen waiting, and more than once: a busy machine makes
+  // all of them look busy now and then, but only one that spins always.
   bool settle() {
+    std::map<std::string, int> seen_waiting;
     return wait_until([&] {
-      if (mode_ == Mode::kDelay && daemon_->stands_still()) return false;
-      const long before = daemon_->processor_time();
-      usleep(kWindow);
-      return daemon_->processor_time() - before < kBusy;
+      usleep(kLookPeriod);
+      bool all_wait = true;
+      for (const auto& [task, waits] : daemon_->tasks()) {
+        all_wait = (seen_waiting[task] += waits) >= kWaitingLooks && all_wait;
+      }
+      return all_wait;
     });
   }
 
   // Untraced and undisturbed it carries out commands, if need be after init has started it again.
   void look_after_it() {
     bool starts_again = daemon_->has_ended() || mode_ == Mode::kKill;
-    if (daemon_->has_ended()) life_.status = daemon_->status();
+    if (daemon_->has_ended()) run_.status = daemon_->status();
     if (starts_again) daemon_->end();  // its children too
     const Files before = read_logs();
     if (starts_again) daemon_ = std::make_unique<TracedDaemon>(nullptr, "");
-    Client client(*daemon_, life_.problems, false);
+    Client client(*daemon_, run_.problems, false);
     if (starts_again) client.send("CHANGEPATH");
     client.send("LOGBEGIN");
     const Files after = read_logs();
@@ -336,51 +309,52 @@ class Story {
     for (const auto& [path, content] : before) {
       auto found = after.find(path);
       if (!starts_again || (found != after.end() && found->second == content)) continue;
-      life_.problems.push_back("started again, it changes or loses " + path);
+      run_.problems.push_back("started again, it changes or loses " + path);
     }
     const std::vector<std::string> marked = marked_directories();
     if (marked.size() != 1) {
-      life_.problems.push_back(std::to_string(marked.size()) + " directories bear the mark");
+      run_.problems.push_back(std::to_string(marked.size()) + " directories bear the mark");
     } else if (read_file(marked[0] + "/versionNumber").size() != 92) {
-      life_.problems.emplace_back("does not begin a capture any more");
+      run_.problems.emplace_back("does not begin a capture any more");
     }
     client.send("LOGSTOP");
     if (client.send("DELETELOG") != "CLEANSUCCESS") {
-      life_.problems.emplace_back("does not delete logs any more");
+      run_.problems.emplace_back("does not delete logs any more");
     }
-    if (!settle()) life_.problems.emplace_back("is busy without end");
+    if (!settle()) run_.problems.emplace_back("is busy without end");
   }
 
   const Mode mode_;
-  Life& life_;
+  Run& run_;
   Files& outside_;  // what was made for it to find is added
   std::unique_ptr<TracedDaemon> daemon_;
   Client client_;
   std::vector<int> nodes_;
   std::set<std::string> known_;  // log directories
+  bool is_deleted_ = false;      // and with them what arrived
 };
 
 }  // namespace
 
-Life live(const Fault* fault, const std::string& traced) {
-  Life life;
+Run run_scenario(const Fault* fault, const std::string& traced) {
+  Run run;
   make_device();
   LogCatcher log;
   log.start();
   PropertyService service;
   Files before, after;
   look_at("/", before);
-  Story(fault, traced, life, before).tell();
+  Scenario(fault, traced, run, before).play();
   look_at("/", after);
-  compare(before, after, life.problems);
+  compare(before, after, run.problems);
   for (const auto& [key, value] : service.requests()) {
     // A request without a value was cut short by the end of the daemon.
     if (*value.c_str() != '\0' && !may_be_set(key, value))
-      life.problems.push_back("sets " + key + " to " + value);
+      run.problems.push_back("sets " + key + " to " + value);
   }
-  if (!partition_is_sound()) life.problems.emplace_back("the partition is neither log nor zeros");
-  life.log = log.texts();
-  return life;
+  if (!partition_is_sound()) run.problems.emplace_back("the partition is neither log nor zeros");
+  run.log = log.texts();
+  return run;
 }
 
 }  // namespace corvexd::faults

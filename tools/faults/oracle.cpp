@@ -1,9 +1,8 @@
-#include "tools/faults/verdict.h"
+#include "tools/faults/oracle.h"
 
 #include <algorithm>
 #include <map>
 #include <regex>
-#include <sstream>
 
 namespace corvexd::faults {
 namespace {
@@ -14,7 +13,7 @@ bool holds(const std::string& text, const char* part) {
 
 constexpr size_t kNamed = 3;  // of what is lost
 
-// What each life without faults achieves, or the daemon itself is broken.
+// What each run without faults achieves, or the daemon itself is broken.
 constexpr const char* kRequired[] = {"one mark",
                                      "a name in the new zone",
                                      "deletion answered CLEANSUCCESS",
@@ -64,8 +63,8 @@ std::string said(const std::string& line) {
   return "says " + std::regex_replace(line, number, "#");
 }
 
-bool says_something_unusual(const Life& life, const Normal& normal) {
-  return std::any_of(life.log.begin(), life.log.end(),
+bool says_something_unusual(const Run& run, const Normal& normal) {
+  return std::any_of(run.log.begin(), run.log.end(),
                      [&](const std::string& line) { return normal.count(said(line)) == 0; });
 }
 
@@ -73,72 +72,56 @@ bool says_something_unusual(const Life& life, const Normal& normal) {
 constexpr const char* kAsksAgain[] = {"wait_for_", "record_cpux_thermal", "property_"};
 
 // One that does not take no for an answer uses up all the refusals there are.
-bool is_stubborn(const Life& life) {
+bool is_stubborn(const Run& run) {
   std::map<std::string, int> refusals;
-  return std::any_of(life.calls.begin(), life.calls.end(), [&](const Call& call) {
+  return std::any_of(run.calls.begin(), run.calls.end(), [&](const Call& call) {
     bool may_ask = std::any_of(std::begin(kAsksAgain), std::end(kAsksAgain),
                                [&](const char* caller) { return holds(call.callers, caller); });
     // Where a library hides the callers, who asks is not known.
-    return !may_ask && !call.site.empty() && ++refusals[call.site] > kShieldCalls / 2;
+    return !may_ask && !call.site.empty() && ++refusals[call.site] > kReservedCalls / 2;
   });
 }
 
-void judge_losses(const Fault* fault, const Normal& normal, Life& life) {
+void judge_losses(const Fault* fault, const Normal& normal, Run& run) {
   bool fails = fault != nullptr && fault->mode == Mode::kFail;
   bool is_delayed = fault != nullptr && fault->mode == Mode::kDelay;
-  bool may_be_silent = std::any_of(life.calls.begin(), life.calls.end(), is_silent);
-  if (fails && (may_be_silent || says_something_unusual(life, normal))) return;
+  bool may_be_silent = std::any_of(run.calls.begin(), run.calls.end(), is_silent);
+  if (fails && (may_be_silent || says_something_unusual(run, normal))) return;
   std::string lost;
   size_t count = 0;
   for (const auto& [name, times] : normal) {
     // What a recorder had in hand when the disturbance ended it is gone.
     if (is_delayed && name.rfind("LOGS/", 0) == 0 && !holds(name, " whole")) continue;
-    if (life.achieved[name] < times && ++count <= kNamed) lost += (count == 1 ? "" : ", ") + name;
+    if (run.achieved[name] < times && ++count <= kNamed) lost += (count == 1 ? "" : ", ") + name;
   }
   if (count == 0) return;
-  life.problems.push_back((fails ? "without a word, it lacks " : "lacks ") + lost + " (" +
-                          std::to_string(count) + " in all)");
+  run.problems.push_back((fails ? "without a word, it lacks " : "lacks ") + lost + " (" +
+                         std::to_string(count) + " in all)");
 }
 
 }  // namespace
 
-void add_to_normal(const Life& life, bool first, Normal& normal) {
+void add_to_normal(const Run& run, bool first, Normal& normal) {
   for (auto& [name, times] : normal) {
-    auto found = life.achieved.find(name);
-    times = std::min(times, found == life.achieved.end() ? 0 : found->second);
+    auto found = run.achieved.find(name);
+    times = std::min(times, found == run.achieved.end() ? 0 : found->second);
   }
-  if (first) normal = life.achieved;
+  if (first) normal = run.achieved;
   for (const char* name : kRequired) normal[name] = std::max(normal[name], 1);
-  for (const std::string& line : life.log) normal[said(line)] = 0;
+  for (const std::string& line : run.log) normal[said(line)] = 0;
 }
 
-std::string write_normal(const Normal& normal) {
-  std::string text;
-  for (const auto& [name, times] : normal) text += std::to_string(times) + " " + name + "\n";
-  return text;
-}
-
-Normal read_normal(const std::string& text) {
-  Normal normal;
-  std::istringstream lines(text);
-  int times;
-  for (std::string name; lines >> times && lines.get() && std::getline(lines, name);) {
-    normal[name] = times;
-  }
-  return normal;
-}
-
-void judge(const Fault* fault, const Normal& normal, Life& life) {
+void judge(const Fault* fault, const Normal& normal, Run& run) {
   bool was_killed = fault != nullptr && fault->mode == Mode::kKill;
   int killed_status = 128 + kKillingSignal;
   bool fails = fault != nullptr && fault->mode == Mode::kFail;
-  if (fails && is_stubborn(life)) life.problems.emplace_back("tries again without end");
-  bool may_end = was_killed ? life.status == killed_status
-                            : life.status == 1 &&
-                                  std::any_of(life.calls.begin(), life.calls.end(), may_end_at);
-  if (life.status == -1 && !was_killed) judge_losses(fault, normal, life);
-  if (life.status != -1 && !may_end) {
-    life.problems.push_back("ends with status " + std::to_string(life.status));
+  if (fails && is_stubborn(run)) run.problems.emplace_back("tries again without end");
+  bool may_end =
+      was_killed ? run.status == killed_status
+                 : run.status == 1 && std::any_of(run.calls.begin(), run.calls.end(), may_end_at);
+  if (run.status == -1 && !was_killed) judge_losses(fault, normal, run);
+  if (run.status != -1 && !may_end) {
+    run.problems.push_back("ends with status " + std::to_string(run.status));
   }
 }
 
