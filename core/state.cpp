@@ -22,6 +22,8 @@ std::atomic<const char*> cache_path{"/cache/"};
 PublishedPath LOG_DIR;
 Path cache_file_path;
 
+Path cache_file(const char* name) { return Path().append(cache_path).append(name); }
+
 void checkLogPath() {
   char watchdog[PROPERTY_VALUE_MAX] = {};
   char path[PROPERTY_VALUE_MAX] = {};

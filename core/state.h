@@ -22,6 +22,9 @@ extern std::atomic<uint8_t> isInDataPartition;
 // The cache log directory, with its trailing "/".
 extern std::atomic<const char*> cache_path;
 
+// The path of a file or directory below it. Any thread.
+Path cache_file(const char* name);
+
 // The current log directory, without a trailing "/"; empty until the first one is made.
 extern PublishedPath LOG_DIR;
 

@@ -16,8 +16,6 @@ constexpr mode_t kAreaMode = 0775;
 
 }  // namespace
 
-Path cache_file(const char* name) { return Path().append(cache_path).append(name); }
-
 void provide_area(const char* name) {
   const Path area = cache_file(name);
   if (access(area.c_str(), R_OK) == 0) return;

@@ -11,6 +11,7 @@
 #include "core/fixed_string.h"
 #include "core/log.h"
 #include "core/sleep.h"
+#include "core/state.h"
 #include "core/thread.h"
 #include "early/area.h"
 

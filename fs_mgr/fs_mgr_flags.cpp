@@ -3,17 +3,28 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <sys/mount.h>
 #include <unistd.h>
 
 #include "fs_mgr/fs_mgr_flags.h"
 #include "fs_mgr/fs_mgr_fstab.h"
 
 const flag_list kMountOptions[] = {
-    {"noatime", 0x400}, {"noexec", 0x8},         {"nosuid", 0x2},
-    {"nodev", 0x4},     {"nodiratime", 0x800},   {"ro", 0x1},
-    {"rw", 0x0},        {"remount", 0x20},       {"bind", 0x1000},
-    {"rec", 0x4000},    {"unbindable", 0x20000}, {"private", 0x40000},
-    {"slave", 0x80000}, {"shared", 0x100000},    {"defaults", 0x0},
+    {"noatime", MS_NOATIME},
+    {"noexec", MS_NOEXEC},
+    {"nosuid", MS_NOSUID},
+    {"nodev", MS_NODEV},
+    {"nodiratime", MS_NODIRATIME},
+    {"ro", MS_RDONLY},
+    {"rw", 0},
+    {"remount", MS_REMOUNT},
+    {"bind", MS_BIND},
+    {"rec", MS_REC},
+    {"unbindable", MS_UNBINDABLE},
+    {"private", MS_PRIVATE},
+    {"slave", MS_SLAVE},
+    {"shared", MS_SHARED},
+    {"defaults", 0},
     {nullptr, 0},
 };
 

@@ -54,23 +54,6 @@ bool copy(const char* text, char** copied) {
   return *copied != nullptr;
 }
 
-void take_values(const fs_mgr_flag_values& values, fstab_entry* entry) {
-  entry->key_location = values.key_location;
-  entry->key_directory = values.key_directory;
-  entry->verity_location = values.verity_location;
-  entry->length = values.length;
-  entry->label = values.label;
-  entry->partition_number = values.partition_number;
-  entry->swap_priority = values.swap_priority;
-  entry->max_comp_streams = values.max_comp_streams;
-  entry->zram_size = values.zram_size;
-  entry->reserved_size = values.reserved_size;
-  entry->file_contents_mode = values.file_contents_mode;
-  entry->file_names_mode = values.file_names_mode;
-  entry->erase_block_size = values.erase_block_size;
-  entry->logical_block_size = values.logical_block_size;
-}
-
 // The next field of a line, or null (logged) when there is none.
 char* next_field(char* line, char** position, const char* what) {
   char* field = strtok_r(line, kDelimiters, position);
@@ -98,10 +81,8 @@ bool parse_entry(char* line, fstab_entry* entry) {
 
   field = next_field(nullptr, &position, "fs_mgr_options");
   if (field == nullptr) return false;
-  fs_mgr_flag_values values;
-  entry->fs_mgr_flags = parse_flags(field, kFsMgrOptions, &values, nullptr, 0);
-  take_values(values, entry);
-  return !values.incomplete;
+  entry->fs_mgr_flags = parse_flags(field, kFsMgrOptions, entry, nullptr, 0);
+  return !entry->incomplete;
 }
 
 int count_entries(Lines& lines) {

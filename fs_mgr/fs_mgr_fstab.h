@@ -4,15 +4,8 @@
 #include <stdint.h>
 #include <stdio.h>
 
-// One entry. Strings are the table's; an absent one is null. The fields from key_location on are
-// the parameters of the fifth field's options.
-struct fstab_entry {
-  char* mount_source;
-  char* mount_point;
-  char* fs_type;
-  uint64_t mount_flags;  // as mount(2) takes them
-  char* mount_options;   // the options that are no mount flags, joined by ","
-  int32_t fs_mgr_flags;
+// The parameters of one entry's fifth field.
+struct fs_mgr_flag_values {
   char* key_location;
   char* key_directory;
   char* verity_location;
@@ -27,6 +20,17 @@ struct fstab_entry {
   uint32_t file_names_mode;
   uint32_t erase_block_size;  // bytes
   uint32_t logical_block_size;
+  bool incomplete;  // memory for a text was lacking
+};
+
+// One entry. Strings are the table's; an absent one is null.
+struct fstab_entry : fs_mgr_flag_values {
+  char* mount_source;
+  char* mount_point;
+  char* fs_type;
+  uint64_t mount_flags;  // as mount(2) takes them
+  char* mount_options;   // the options that are no mount flags, joined by ","
+  int32_t fs_mgr_flags;
 };
 
 struct fstab {
@@ -57,25 +61,6 @@ struct fstab_entry* fs_mgr_get_entry_for_mount_point(struct fstab* table, const 
 struct flag_list {
   const char* keyword;
   uint32_t value;
-};
-
-// The parameters of one entry's options, as fstab_entry holds them.
-struct fs_mgr_flag_values {
-  char* key_location;
-  char* key_directory;
-  char* verity_location;
-  int64_t length;
-  char* label;
-  int32_t partition_number;
-  int32_t swap_priority;
-  int32_t max_comp_streams;
-  uint32_t zram_size;
-  uint64_t reserved_size;
-  uint32_t file_contents_mode;
-  uint32_t file_names_mode;
-  uint32_t erase_block_size;
-  uint32_t logical_block_size;
-  bool incomplete;  // memory for a text was lacking
 };
 
 struct fstab* fs_mgr_read_fstab_file(FILE* file);

@@ -87,7 +87,7 @@ void copy_folder(const char* src_dir, const char* sub) {
   std::unique_lock<std::mutex> lock(current_directory_mutex);
   Path path = LOG_DIR.get();
   // Before the first capture there is no log directory, and nothing is to be made elsewhere.
-  const bool is_known = *path.c_str() != '\0';
+  const bool is_known = !path.empty();
   if (!path.append(sub).fits_or_log()) return;
   const unique_fd folder = is_known ? open_or_make_folder(path.c_str()) : unique_fd();
   lock.unlock();

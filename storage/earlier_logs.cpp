@@ -25,9 +25,8 @@ constexpr EarlierLogs kEarlierLogs[] = {
 
 void* copy_file_already_exist(void*) {
   for (const EarlierLogs& logs : kEarlierLogs) {
-    Path source;
-    if (logs.in_cache) source.append(cache_path);
-    copy_folder(source.append(logs.source).c_str(), logs.sub);
+    const Path source = logs.in_cache ? cache_file(logs.source) : Path().append(logs.source);
+    copy_folder(source.c_str(), logs.sub);
   }
   return nullptr;
 }

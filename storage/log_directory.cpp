@@ -121,10 +121,8 @@ void remove_marks() {
 }
 
 int make_log_directory() {
-  cache_file_path.clear().append(cache_path).append("fileAfter911");
-  const Path after_source = cache_file_path;
-  cache_file_path.clear().append(cache_path).append("fileBefore911");
-  const Path before_source = cache_file_path;
+  const Path after_source = cache_file_path = cache_file("fileAfter911");
+  const Path before_source = cache_file_path = cache_file("fileBefore911");
 
   const Path directory = next_log_directory();
   LOG_DIR.set(directory);
