@@ -1,6 +1,7 @@
 #include "storage/copy.h"
 
 #include <android-base/unique_fd.h>
+#include <errno.h>
 #include <fcntl.h>
 #include <stdint.h>
 #include <sys/stat.h>

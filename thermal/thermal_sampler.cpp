@@ -2,6 +2,7 @@
 
 #include <android-base/unique_fd.h>
 #include <cutils/properties.h>
+#include <errno.h>
 #include <fcntl.h>
 #include <stdlib.h>
 #include <string.h>

@@ -31,6 +31,7 @@ constexpr struct {
   const char* caller;
 } kSilent[] = {
     {"", "property_get"},       // the default counts
+    {"", "local_time"},         // the zone that was known last counts
     {"inotify_add_watch", ""},  // a directory that is not there is not watched
     {"read", "copy_file"},      // what can be copied is
     {"write", "copy_file"},

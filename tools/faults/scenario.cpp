@@ -177,8 +177,9 @@ class Scenario {
     int trace = open("/data/anr/anr_open", O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
     write_to(trace, kArtefactStart);
     send_all({"CACHECLEAR", "BUGREPORT", "WIFI_SNIFFLOG_START", "OEM_GPS_DEBUG_ENABLE",
-              "OEM_BT_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE", "LOGSTOP"});
-    settle();
+              "OEM_BT_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE"});
+    settle();  // its recorders, too, have begun then
+    send_all({"LOGSTOP"});
     write_file("/etc/localtime", far_zone());
     send_all({"LOGBEGIN"});
     write_to(trace, kArtefactEnd);
