@@ -131,8 +131,8 @@ class Scenario {
     beside_others(&Scenario::after_delete);
     settle();
     run_.calls = daemon_->let_go();
-    for (int fd : nodes_) close(fd);
     look_after_it();
+    for (int fd : nodes_) close(fd);  // not sooner: a reader whose source has ended reads on and on
   }
 
  private:
