@@ -135,11 +135,11 @@ void copy_source(const NodeReader& reader, const char* path) {
   }
 }
 
+// Each block goes to its own place: nothing beyond the area is erased, whatever fails.
 void erase_source(const NodeReader& reader) {
   const char zeros[kBlockSize] = {};
-  lseek(*reader.from_fd, 0, SEEK_SET);
   for (int i = 0; i < reader.max_reads; ++i) {
-    if (write(*reader.from_fd, zeros, sizeof zeros) == -1) {
+    if (pwrite(*reader.from_fd, zeros, sizeof zeros, i * sizeof zeros) == -1) {
       log_failed_write(reader, errno);
       return;
     }

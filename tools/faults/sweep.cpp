@@ -65,6 +65,7 @@ const std::vector<Row> kRows = {
     {"kill", SYS_kill, {"error=EPERM", "error=ESRCH"}, "error=EPERM"},
     {"write", SYS_write, {"error=EIO", "error=EINTR", "retval=1"}, "error=ENOSPC"},
     {"read", SYS_read, {"error=EIO", "error=EINTR"}, "error=EAGAIN"},
+    {"pwrite64", SYS_pwrite64, {"error=EIO"}, "error=ENOSPC"},
     {"lseek", SYS_lseek, {"error=EIO"}, nullptr},
     {"openat", SYS_openat, {"error=EMFILE"}, "error=ENFILE"},
     {"close", SYS_close, {"error=EIO"}, nullptr},
