@@ -36,7 +36,8 @@ collect() { in_device setprop persist.sys.assert.panic "$1"; }
 
 echo "booting the device in $root"
 boot "$@"
-echo "the daemon's start, as the log tells of it:"
+echo "the daemon's start, as the log tells of it (E stands before many routine lines; it waits for the"
+echo "storage to come up):"
 in_device timeout $((patience * 2)) bash -s <"$here/show/start.sh" &
 teller=$!
 

@@ -167,8 +167,9 @@ void count_logs(const Files& logs, Achievements& achieved) {
   static const std::regex directory("/data/corvex/KVBR_[0-9]+--");
   static const std::regex time("[0-9]{4}(-[0-9]{1,2}){5}"), number("[0-9]+");
   for (const auto& [path, facts] : logs) {
-    // Recorders and their copying begin together; which is first is chance.
+    // Recorders and their copying begin together; which is first is chance. And a marker is no log.
     if (path.find("/log_before_initial/") != std::string::npos) continue;
+    if (ends_with(path, "/.nomedia")) continue;
     std::string name = std::regex_replace(path, directory, "LOGS/");
     name = std::regex_replace(std::regex_replace(name, time, "TIME"), number, "#");
     ++achieved[name];
