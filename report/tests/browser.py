@@ -19,20 +19,15 @@ SENT = "Network.requestWillBeSent"
 
 class Browser:
     def __init__(self) -> None:
-        self._home = tempfile.TemporaryDirectory(
-            prefix="corvex-report-browser-", ignore_cleanup_errors=True
-        )
+        prefix = "corvex-report-browser-"
+        self._home = tempfile.TemporaryDirectory(prefix=prefix, ignore_cleanup_errors=True)
         options: Any = webdriver.ChromeOptions()
         options.binary_location = "/usr/bin/chromium"
         for argument in [*ARGUMENTS, f"--user-data-dir={self._home.name}/profile"]:
             options.add_argument(argument)
         options.set_capability("goog:loggingPrefs", {"browser": "ALL", "performance": "ALL"})
         # There may be no home to write to.
-        places = {
-            "HOME": self._home.name,
-            "XDG_CONFIG_HOME": self._home.name,
-            "TMPDIR": self._home.name,
-        }
+        places = dict.fromkeys(("HOME", "XDG_CONFIG_HOME", "TMPDIR"), self._home.name)
         service = Service("/usr/bin/chromedriver", env={"PATH": "/usr/bin:/bin", **places})
         self._driver: Any = webdriver.Chrome(service=service, options=options)
 
@@ -40,12 +35,12 @@ class Browser:
         self._driver.quit()
         self._home.cleanup()
 
-    def open(self, page: Path, width: int, dark: bool = False) -> None:
+    def open(self, page: Path, width: int, scheme: str = "light") -> None:
         """As on a screen of that width."""
         screen = {"width": width, "height": 900, "deviceScaleFactor": 1, "mobile": width < 600}
-        scheme = [{"name": "prefers-color-scheme", "value": "dark" if dark else "light"}]
+        media = [{"name": "prefers-color-scheme", "value": scheme}]
         self._driver.execute_cdp_cmd("Emulation.setDeviceMetricsOverride", screen)
-        self._driver.execute_cdp_cmd("Emulation.setEmulatedMedia", {"features": scheme})
+        self._driver.execute_cdp_cmd("Emulation.setEmulatedMedia", {"features": media})
         self._driver.get(page.as_uri())
 
     def run(self, script: str) -> Any:

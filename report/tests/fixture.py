@@ -101,11 +101,8 @@ def make_capture(parent: Path) -> Path:
     capture = parent / NAME
     end = BEGUN + LENGTH
     (capture / "boot_log").mkdir(parents=True)
-    put(
-        capture / "versionNumber",
-        PROPERTIES["ro.build.ota.versionname"].encode().ljust(92, b"\0"),
-        BEGUN,
-    )
+    version = PROPERTIES["ro.build.ota.versionname"].encode()
+    put(capture / "versionNumber", version.ljust(92, b"\0"), BEGUN)
     put_properties(capture, PROPERTIES)
     cuts = [BEGUN - 20, BEGUN + 200, BEGUN + 400, end]
     for name, first, last in zip(
@@ -120,10 +117,9 @@ def make_capture(parent: Path) -> Path:
         put(capture / name, packets(first, first + 165, 0.3), first + 165)
     put(capture / "qsee.log", firmware("qsee", end), end)
     put(capture / "tz.log", firmware("tz", end), end)
-    put(capture / "bootloader.log", b"B -      7758 - pbl, started\n" * 60, BEGUN + 1)
-    put(
-        capture / "pre_bootloader.log", (b"B -      7758 - pbl, started\n" * 900)[:20480], BEGUN + 1
-    )
+    line = b"B -      7758 - pbl, started\n"
+    put(capture / "bootloader.log", line * 60, BEGUN + 1)
+    put(capture / "pre_bootloader.log", (line * 900)[:20480], BEGUN + 1)
     record = "".join(sample(time) for time in spread(BEGUN + 10, end - 20, 3))
     put(capture / "kv_tsen_data/20261123_03140", record.encode(), end - 20)
     put_artefacts(capture)
@@ -135,6 +131,13 @@ def put_properties(capture: Path, properties: dict[str, str]) -> None:
     put(capture / "getprop.txt", text.encode("utf-8", "surrogateescape"), BEGUN)
 
 
+def put_dropbox(
+    capture: Path, tag: str, time: float, text: str, *, folder: str = "dropbox"
+) -> None:
+    entry = f"{tag}@{int((time - AHEAD) * 1000)}.txt.gz"
+    put(capture / folder / entry, gzip.compress(text.encode()), time)
+
+
 def put_artefacts(capture: Path) -> None:
     crash = "pid: 2718, tid: 2731, name: RenderThread  >>> com.example.{} <<<\nsignal {}, code 1\n"
     signals = (("gallery", "11 (SIGSEGV)"), ("camera", "6 (SIGABRT)"))
@@ -143,15 +146,11 @@ def put_artefacts(capture: Path) -> None:
         path = capture / "tombstones" / stamp(time, "%Y-%m-%d-%H-%M-%S") / f"tombstone_0{index}"
         text = crash.format(name, signal).encode()
         put(path, text, time)
-        entry = f"data_app_crash@{int((time - AHEAD) * 1000)}.txt.gz"
-        put(capture / "dropbox" / entry, gzip.compress(text), time)
+        put_dropbox(capture, "data_app_crash", time, text.decode())
     time = BEGUN + 262
     name = stamp(time, "%Y-%m-%d-%H-%M-%S")
-    put(
-        capture / "anr" / name / f"anr_{name}",
-        b"----- pid 2718 -----\nCmd line: com.example.gallery\n",
-        time,
-    )
+    trace = b"----- pid 2718 -----\nCmd line: com.example.gallery\n"
+    put(capture / "anr" / name / f"anr_{name}", trace, time)
     for state in ("state", "transactions", "transaction_log", "dumpsys_input"):
         put(capture / "anr" / name / state, b"state\n", time)
     put(capture / "Screenshots" / f"Screenshot_{name}.png", b"\x89PNG", time)
@@ -172,20 +171,14 @@ def enlarge(capture: Path, mib: int) -> None:
     for index in range(count + 1):
         first = BEGUN + index * long
         name = f"android.log.{count - index:02}" if index < count else "android.log"
-        put(
-            capture / name,
-            logcat(first, first + long, long / 360000, "ActivityManager"),
-            first + long,
-        )
+        lines = logcat(first, first + long, long / 360000, "ActivityManager")
+        put(capture / name, lines, first + long)
     length = (count + 1) * long
     for index, name in enumerate(RING):
         first = BEGUN + index * length / 3
+        last = first + length / 3
         size = mib * 1024 * 1024 // 15
-        put(
-            capture / name,
-            packets(first, first + length / 3, length / 3 / (size / 600), 584),
-            first + length / 3,
-        )
+        put(capture / name, packets(first, last, (last - first) / (size / 600), 584), last)
 
 
 if __name__ == "__main__":

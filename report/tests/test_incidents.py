@@ -1,16 +1,14 @@
 """What is found to have gone wrong, and what is not."""
 
-import gzip
 import json
 import os
 import shutil
-from datetime import datetime, timezone
 from typing import Any
 
-from fixture import AHEAD, BEGUN, BOOT, LENGTH, PROPERTIES, logcat, put, put_properties, stamp
+from fixture import BEGUN, BOOT, LENGTH, PROPERTIES, logcat, put, put_dropbox, put_properties, stamp
 from reporting import ReportTest, run
 from trouble import ABORTED, BARK, DROPPED, HUNG, JAVA, NATIVE, OOPS, PANIC, TRACE
-from trouble import dmesg, dropbox, kmsg, lines, put_log, quotes, trouble
+from trouble import dmesg, kmsg, lines, logged, put_log, trouble
 
 END = BEGUN + LENGTH
 NULL = "Unable to handle kernel NULL pointer dereference at virtual address 00000008"
@@ -40,14 +38,10 @@ class KindsTest(IncidentTest):
         trouble(self.capture)
         found = self.incidents()
         hwui = "/system/lib64/libhwui.so (gallery::Layer::draw()+24)"
+        stuck = "com.android.server.am.Stuck.hold(Stuck.java:7)"
         expected = [
             ("kernel-panic", "kworker/2:1", "cvx_panel_off", 1),
-            (
-                "system-restart",
-                "system_server",
-                "com.android.server.am.Stuck.hold(Stuck.java:7)",
-                1,
-            ),
+            ("system-restart", "system_server", stuck, 1),
             ("hung-task", "mmcqd/0", "mmc_wait_for_req", 1),
             ("lockup", None, None, 1),
             ("native-crash", "com.example.gallery", hwui, 1),
@@ -93,18 +87,15 @@ class KindsTest(IncidentTest):
 
     def test_what_is_none(self) -> None:
         put(self.capture / "tombstones/2026-11-23-00-33-00/tombstone_00", b"", BEGUN)
-        put(self.capture / dropbox("dropbox/data_app_crash", BEGUN).replace(".gz", ".lost"), b"", 0)
+        put(self.capture / "dropbox/data_app_crash@1795386690000.txt.lost", b"", 0)
         dumps = {name: TRACE.encode() for name in ("state", "transactions", "dumpsys_input")}
         for name, text in dumps.items():
             put(self.capture / "anr/2026-11-23-00-33-00" / name, text, BEGUN)
-        put(self.capture / dropbox("dropbox/data_app_wtf", BEGUN), gzip.compress(JAVA.encode()), 0)
-        put(
-            self.capture / "2026-11-23-00-41-30-BUGREPORT.log", quotes(BEGUN) + NATIVE.encode(), END
-        )
+        put_dropbox(self.capture, "data_app_wtf", BEGUN, JAVA)
+        quotes = logged("quotes.txt")
+        put(self.capture / "2026-11-23-00-41-30-BUGREPORT.log", quotes + NATIVE.encode(), END)
         put_properties(self.capture, PROPERTIES | {"debug.x": "Kernel panic - not syncing: x"})
-        self.android(
-            quotes(BEGUN), lines(BEGUN, 1, "I lowmemorykiller", "Killing 'x' (7), adj 900")
-        )
+        self.android(quotes, lines(BEGUN, 1, "I lowmemorykiller", "Killing 'x' (7), adj 900"))
         died = lines(BEGUN, 911, "I am_proc_died", "[0,1,x,0,2]")
         put_log(self.capture / "event.log", died, lines(BEGUN, 911, "I am_kill", "[0,1,x,0,y]"))
         quoted = b"14,1,9000000,-;Kernel panic - not syncing: an application wrote it\n"
@@ -119,19 +110,11 @@ class SourcesTest(IncidentTest):
         """Past the machinery of dying, into the root cause; a text is judged by what it holds."""
         where = "/vendor/lib64/libqueue.so (Queue::push(int)+112)"
         put(self.capture / "tombstones/2026-11-23-00-33-00/tombstone_01", ABORTED.encode(), END)
-        put(
-            self.capture / dropbox("dropbox/data_app_crash", END), gzip.compress(NATIVE.encode()), 0
-        )
+        put_dropbox(self.capture, "data_app_crash", END, NATIVE)
         bare = NATIVE.replace(" (gallery::Layer::draw()+24)", "").replace("gallery", "bare")
-        put(
-            self.capture / dropbox("dropbox/SYSTEM_TOMBSTONE", END), gzip.compress(bare.encode()), 0
-        )
+        put_dropbox(self.capture, "SYSTEM_TOMBSTONE", END, bare)
         server = DROPPED.replace("com.example.mail", "system_server", 1)
-        put(
-            self.capture / dropbox("dropbox/system_server_crash", END),
-            gzip.compress(server.encode()),
-            0,
-        )
+        put_dropbox(self.capture, "system_server_crash", END, server)
         inbox = "com.example.mail.Inbox.open(Inbox.java:42)"
         gallery = "/system/lib64/libhwui.so (gallery::Layer::draw()+24)"
         expected = [
@@ -148,13 +131,9 @@ class SourcesTest(IncidentTest):
     def test_forms_of_the_kernel_log(self) -> None:
         """logcat takes the beginning of a line for a tag, and has no process for it."""
         texts = (HUNG + OOPS).splitlines() + ["BUG: soft lockup - CPU#1 stuck for 22s! [x:9]"]
-        rows = [
-            (f"I {'INFO' if text.startswith('INFO') else 'BUG'}", text.split(": ", 1)[1])
-            if text.startswith(("INFO: ", "BUG: "))
-            else ("I -", text)
-            for text in texts
-        ]
-        log = b"".join(lines(BEGUN + i / 100, 0, *row) for i, row in enumerate(rows))
+        log = b"".join(lines(BEGUN + i / 100, 0, "I -", text) for i, text in enumerate(texts))
+        log = log.replace(b"I -       : INFO: ", b"I INFO    : ")
+        log = log.replace(b"I -       : BUG: ", b"I BUG     : ")
         put(self.capture / "kernel.log", log.replace(b"I -       :", b"I         :"), END)
         expected = [
             ("hung-task", "mmcqd/0", "mmc_wait_for_req", 1),
@@ -168,15 +147,11 @@ class SourcesTest(IncidentTest):
         at = stamp(BEGUN + 30, "%m-%d %H:%M:%S.000")
         signal = "Fatal signal 6 (SIGABRT), code -6 in tid 930 (android.bg)"
         server = ABORTED.replace("/vendor/bin/camera", "system_server").replace("3001", "911")
+        exit = "Exit zygote because system server (911) has terminated"
         dumped = "".join(f"{at} F/DEBUG   ( 9000): {line}\n" for line in server.splitlines())
         self.android(
             f"{at} F/libc    (  911): {signal}\n{dumped}".encode(),
-            lines(
-                BEGUN + 33,
-                498,
-                "E Zygote",
-                "Exit zygote because system server (911) has terminated",
-            ),
+            lines(BEGUN + 33, 498, "E Zygote", exit),
         )
         log = lines(BEGUN + 60, 0, "I -", f"<0>[ 5123.456] (2)[9:x]{PANIC.replace('Fatal', 'Bad')}")
         put(self.capture / "boot_log/kernel_boot.log", log, END)
@@ -189,13 +164,10 @@ class SourcesTest(IncidentTest):
         put(self.capture / "recovery/last_kmsg", dmesg(8, told) + dmesg(70, OOPS + PANIC), END)
         put(self.capture / "kmsg/console", dmesg(900, BARK) + dmesg(910, "x\n"), END)
         put(self.capture / "recovery/console", dmesg(900, BARK) + dmesg(910, "x\n"), END)
-        before = BEGUN - 86400
-        put(
-            self.capture / "boot_log/android_boot.log.pre", lines(before, 9, "F DEBUG", NATIVE), END
-        )
+        crash = lines(BEGUN - 86400, 9, "F DEBUG", NATIVE)
+        put(self.capture / "boot_log/android_boot.log.pre", crash, END)
         put(self.capture / "anr/traces.txt", TRACE.format(time="2026-11-19 08:09:10").encode(), END)
-        entry = dropbox("anr/data_app_crash", BEGUN - 3600)
-        put(self.capture / entry, gzip.compress(DROPPED.encode()), END)
+        put_dropbox(self.capture, "data_app_crash", BEGUN - 3600, DROPPED, folder="anr")
         put(self.capture / "anr/SYSTEM_LAST_KMSG@1795386000000.txt", dmesg(5, HUNG), END)
         times = [(one["kind"], one["count"], one["first"]) for one in self.incidents()]
         expected = [
