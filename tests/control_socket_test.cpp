@@ -97,7 +97,7 @@ TEST_F(ControlSocket, AnIllBehavedClientCostsItsOwnConnection) {
   }
   close(flooding.fd);
   EXPECT_EQ("CLEANSUCCESS", send_commands({"DELETELOG"}));
-  EXPECT_TRUE(eventually([&] { return list(descriptors).size() <= idle; }));
+  EXPECT_EVENTUALLY(list(descriptors).size() <= idle);
 }
 
 TEST_F(ControlSocket, ClientsSeeTheEndOfTheDaemonThoughItsReadersLiveOn) {

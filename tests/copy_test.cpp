@@ -133,21 +133,21 @@ TEST_F(Copy, FolderTakesEveryPlainFileWhateverItsName) {
 }
 
 TEST_F(Copy, EarlierLogsLandInTheirFolders) {
-  run("mkdir -p /cache/log_before_initial /cache/lkmsg /cache/recovery /data/anr "
-      "/data/system/dropbox");
-  write_file("/cache/log_before_initial/android_initial.log", "initial");
-  write_file("/cache/lkmsg/last", "kernel");
-  write_file("/cache/recovery/last", "recovery");
-  write_file("/data/anr/same", "trace");
-  write_file("/data/system/dropbox/same", "entry");
-  write_file("/data/system/dropbox/other", "entry");
+  const char* rows[][3] = {
+      {"/cache/log_before_initial/android_initial.log", "initial",
+       "/data/log/log_before_initial/android_initial.log"},
+      {"/cache/lkmsg/last", "kernel", "/data/log/kmsg/last"},
+      {"/cache/recovery/last", "recovery", "/data/log/recovery/last"},
+      {"/data/anr/trace", "trace", "/data/log/anr/trace"},
+      {"/data/system/dropbox/entry", "entry", "/data/log/anr/entry"},
+  };
+  for (const auto& [from, content, to] : rows) {
+    run(std::string("mkdir -p $(dirname ") + from + ")");
+    write_file(from, content);
+  }
   copy_file_already_exist(nullptr);
+  for (const auto& [from, content, to] : rows) EXPECT_EQ(content, read_file(to)) << from;
   EXPECT_EQ((Texts{"anr", "kmsg", "log_before_initial", "recovery"}), list("/data/log"));
-  EXPECT_EQ("initial", read_file("/data/log/log_before_initial/android_initial.log"));
-  EXPECT_EQ("kernel", read_file("/data/log/kmsg/last"));
-  EXPECT_EQ("recovery", read_file("/data/log/recovery/last"));
-  EXPECT_EQ("traceentry", read_file("/data/log/anr/same"));
-  EXPECT_EQ("entry", read_file("/data/log/anr/other"));
 }
 
 }  // namespace

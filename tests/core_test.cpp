@@ -147,9 +147,9 @@ TEST_F(Core, NamesTellTheLocalTime) {
     run("rm -rf /data/thermal && mkdir /data/thermal");
     const pid_t sampler = fork();
     if (sampler == 0) record_cpux_thermal("/data/thermal/", 0);
-    EXPECT_TRUE(eventually([&] {
-      return read_file("/data/thermal/" + row.record).rfind("datetime=" + row.line + ",", 0) == 0;
-    })) << row.line;
+    EXPECT_EVENTUALLY(
+        read_file("/data/thermal/" + row.record).rfind("datetime=" + row.line + ",", 0) == 0)
+        << row.line;
     kill(sampler, SIGKILL);
     waitpid(sampler, nullptr, 0);
   }

@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <fstream>
+#include <iterator>
 
 namespace corvexd::test {
 
@@ -78,6 +79,12 @@ int status_in_child(const std::function<void()>& body) {
   int status = 0;
   EXPECT_EQ(child, waitpid(child, &status, 0));
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+std::vector<pid_t> children_of(pid_t pid) {
+  const std::string number = std::to_string(pid);
+  std::ifstream numbers("/proc/" + number + "/task/" + number + "/children");
+  return {std::istream_iterator<pid_t>(numbers), {}};
 }
 
 // A zombie has an empty command line.

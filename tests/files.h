@@ -28,6 +28,8 @@ void run(const std::string& command);
 // Runs this in a child; its exit status, 0 when it returns, -1 when a signal ended it.
 int status_in_child(const std::function<void()>& body);
 
+std::vector<pid_t> children_of(pid_t pid);
+
 // Whether the process has ended, be it as a zombie.
 bool has_ended(pid_t pid);
 
@@ -36,5 +38,7 @@ int bound_socket(int type, const char* path);
 
 // Asks `done` until it is true, for ten seconds at most; whether it came to that.
 bool eventually(const std::function<bool()>& done);
+#define EXPECT_EVENTUALLY(...) EXPECT_TRUE(eventually([&] { return __VA_ARGS__; }))
+#define ASSERT_EVENTUALLY(...) ASSERT_TRUE(eventually([&] { return __VA_ARGS__; }))
 
 }  // namespace corvexd::test

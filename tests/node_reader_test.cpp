@@ -41,9 +41,7 @@ class Reader : public DeviceTest {
   void start(NodeReader reader, const char* source = nullptr) {
     if (source != nullptr) reader.source = source;
     child_ = fork();
-    if (child_ != 0) return;
-    run_node_reader(reader);
-    _exit(1);
+    if (child_ == 0) _exit((run_node_reader(reader), 1));
   }
 
   // The exit status of the child that ended, or -1 when a signal ended it.
@@ -68,9 +66,8 @@ class Reader : public DeviceTest {
 TEST_F(Reader, FirmwareLogIsRotatedEveryTwentyMebibytes) {
   write_file("/data/source", numbered(45 << 20));
   start(kQseeReader, "/data/source");
-  EXPECT_TRUE(eventually([] {
-    return exists("/data/log/qsee.log.2") && read_file("/data/log/qsee.log").size() == 5 << 20;
-  }));
+  EXPECT_EVENTUALLY(exists("/data/log/qsee.log.2") &&
+                    read_file("/data/log/qsee.log").size() == 5 << 20);
   EXPECT_EQ(-1, end(SIGTERM));
   EXPECT_EQ(3u, list("/data/log").size());
   EXPECT_EQ(20u << 20, read_file("/data/log/qsee.log.2").size());
@@ -83,7 +80,7 @@ TEST_F(Reader, KernelLogKeepsEveryByteOverHundredsOfRotations) {
   strcpy(kernel_logsize, "1x");
   write_file("/data/source", numbered(300'500));
   start(kKernelReader, "/data/source");
-  EXPECT_TRUE(eventually([&] { return log.count("offset 293") == 1; }));
+  EXPECT_EVENTUALLY(log.count("offset 293") == 1);
   usleep(50'000);
   EXPECT_LE(descriptors(), list("/proc/self/fd").size() + 2) << "its source and its output";
   EXPECT_EQ(-1, end(SIGTERM));
@@ -151,7 +148,7 @@ TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
   int source = open("/data/source", O_WRONLY);
   auto feed = [source](const char* text) { EXPECT_GT(write(source, text, strlen(text)), 0); };
   feed("before");
-  EXPECT_TRUE(eventually([] { return read_file("/data/log/kernel.log") == "before"; }));
+  EXPECT_EVENTUALLY(read_file("/data/log/kernel.log") == "before");
   const size_t held = descriptors();
   unlink("/data/log/kernel.log");
   feed("lost");
@@ -159,7 +156,7 @@ TEST_F(Reader, ALostFileTakesOnlyTheWriteThatNoticedIt) {
       log.has("corvexd: Kernel log node can not access: /data/log/kernel.log, errno: 2, No "
               "such file or directory\n"));
   feed("after");
-  EXPECT_TRUE(eventually([] { return read_file("/data/log/kernel.log") == "after"; }));
+  EXPECT_EVENTUALLY(read_file("/data/log/kernel.log") == "after");
   EXPECT_EQ(held, descriptors());
   run("rm -r /data/log");
   feed("gone");

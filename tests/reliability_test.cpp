@@ -130,7 +130,7 @@ TEST_F(Reliability, GoesOnWhenStorageIsFullOrGone) {
     const Texts before = list("/data/corvex");
     for (int start = 0; start < 3; ++start) {
       daemon = std::make_unique<BootingDaemon>();
-      EXPECT_TRUE(eventually([&] { return has_ended(daemon->pid()); }));
+      EXPECT_EVENTUALLY(has_ended(daemon->pid()));
     }
     EXPECT_EQ(before.size(), list("/data/corvex").size());
     set_property("persist.sys.assert.panic", "false");
@@ -145,7 +145,7 @@ TEST_F(Reliability, GoesOnWhenStorageIsFullOrGone) {
     EXPECT_TRUE(captures()) << place;
     run("head -c 5M /dev/zero >" + place + "/filler 2>/dev/null; true");
     log.clear();
-    EXPECT_TRUE(eventually([&] { return log.count("filename is tombstone_") > 50; })) << place;
+    EXPECT_EVENTUALLY(log.count("filename is tombstone_") > 50) << place;
     run("rm " + place + "/filler");
     EXPECT_TRUE(captures()) << place;
 

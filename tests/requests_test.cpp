@@ -68,7 +68,7 @@ TEST_F(Requests, TagsFollowTheirSwitchesAndCommands) {
     const auto info = of_tags("INFO"), verbose = of_tags("VERBOSE");
     const size_t passes = pauses(2);
     Daemon daemon(log);
-    EXPECT_TRUE(eventually([&] { return pauses(2) == passes + 8; }));
+    EXPECT_EVENTUALLY(pauses(2) == passes + 8);
     EXPECT_EQ(8 * (*gps == '1' ? 12 : 64), of_tags("INFO") - info) << gps << bluetooth;
     EXPECT_EQ(8 * (*gps == '1' ? 76 : 24), of_tags("VERBOSE") - verbose) << gps << bluetooth;
     EXPECT_EQ("1", property("persist.oem.nfc.debug"));
@@ -76,7 +76,7 @@ TEST_F(Requests, TagsFollowTheirSwitchesAndCommands) {
   }
   const size_t passes = pauses(2);
   Daemon daemon(log);
-  EXPECT_TRUE(eventually([&] { return pauses(2) == passes + 8; }));
+  EXPECT_EVENTUALLY(pauses(2) == passes + 8);
   struct {
     const char* command;
     const char* tag;  // one of them
@@ -108,7 +108,7 @@ class Minutes {
  public:
   static void pass() {
     write_file(kEnd, "");
-    EXPECT_TRUE(eventually([] { return !exists(kEnd); }));
+    EXPECT_EVENTUALLY(!exists(kEnd));
   }
   // That of the boot recorders; who else pauses as long may take the sign first.
   static void end_the_first(LogCatcher& log) {
@@ -190,10 +190,9 @@ TEST_F(Requests, SnifferRunsTheVendorsToolsAndEndsItsEarlierOnes) {
   send_commands({"WIFI_SNIFFLOG_START"});
   EXPECT_EQ(5u, probe_reports(5).size());
   EXPECT_EQ(4u, pauses(5)) << "each time in the daemon and in the tool's process";
-  EXPECT_TRUE(eventually([&] {
-    return std::count_if(first.begin(), first.end(),
-                         [](const auto& report) { return has_ended(report.pid); }) == 2;
-  })) << "the stop job's child lives on";
+  EXPECT_EVENTUALLY(std::count_if(first.begin(), first.end(),
+                                  [](const auto& report) { return has_ended(report.pid); }) == 2)
+      << "the stop job's child lives on";
 }
 
 }  // namespace

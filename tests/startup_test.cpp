@@ -36,7 +36,7 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   }
   write_file("/data/.layout_version", "2");
   const size_t waited = log.count(layout_line);
-  EXPECT_TRUE(eventually([&] { return log.count(layout_line) > waited + 2; }));
+  EXPECT_EVENTUALLY(log.count(layout_line) > waited + 2);
   EXPECT_FALSE(listens());
   write_file("/data/.layout_version", "4");
   ASSERT_TRUE(log.has(mount_line));
@@ -45,7 +45,7 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
     set_property("vold.internalSD.mount", mount);
     set_property("ro.mount.tempfs", on_tempfs);
     const size_t seen = log.count(mount_line);
-    EXPECT_TRUE(eventually([&] { return log.count(mount_line) > seen + 2; })) << mount << on_tempfs;
+    EXPECT_EVENTUALLY(log.count(mount_line) > seen + 2) << mount << on_tempfs;
     EXPECT_FALSE(listens());
   }
   EXPECT_GT(pauses(1), 2u * std::size(others));
@@ -111,7 +111,7 @@ TEST_F(Startup, WaitsForTheFrameworkOfAnEncryptedDevice) {
     set_property("vold.internalSD.mount", mount);
     set_property("vold.decrypt", decrypt);
     const size_t seen = pauses(1);
-    EXPECT_TRUE(eventually([&] { return pauses(1) > seen + 2; })) << decrypt << mount;
+    EXPECT_EVENTUALLY(pauses(1) > seen + 2) << decrypt << mount;
     EXPECT_FALSE(listens());
   }
   set_property("vold.internalSD.mount", "1");
@@ -144,20 +144,19 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   // The minute ends: the boot recorders with it, and their files come into the capture.
   write_file("/cache/boot_log/android_boot.log", "boot");
   write_file("/cache/boot_log/radio_boot.log.1.pre", "before");
-  ASSERT_TRUE(eventually([] { return exists("/probe/pause_60"); }));
+  ASSERT_EVENTUALLY(exists("/probe/pause_60"));
   EXPECT_EQ(0u, log.count("executeOnBootLogcat stop"));
   // Whoever pauses as long may take the sign first.
   EXPECT_TRUE(eventually([&] {
     write_file("/probe/end_pause_60", "");
     return log.count("corvexd: executeOnBootLogcat stop \n") == 1;
   }));
-  EXPECT_TRUE(eventually([&] { return list(directory + "/boot_log").size() == 2; }));
+  EXPECT_EVENTUALLY(list(directory + "/boot_log").size() == 2);
   EXPECT_EQ("boot", read_file(directory + "/boot_log/android_boot.log"));
   const std::vector<ProbeReport> recorders = probe_reports(5);
-  EXPECT_TRUE(eventually([&] {
-    return std::count_if(recorders.begin(), recorders.end(),
-                         [](const auto& report) { return has_ended(report.pid); }) == 4;
-  })) << "the capture's recorder goes on";
+  EXPECT_EVENTUALLY(std::count_if(recorders.begin(), recorders.end(),
+                                  [](const auto& report) { return has_ended(report.pid); }) == 4)
+      << "the capture's recorder goes on";
 }
 
 TEST_F(Startup, EachBootSetsTheFilesOfTheLastOneAside) {
@@ -236,12 +235,12 @@ TEST_F(Startup, TheInitialPhaseKeepsToItsSize) {
   set_property("vold.internalSD.mount", "1");
   BootingDaemon daemon;
   ASSERT_TRUE(log.has("corvexd: delete_file start!\n"));
-  ASSERT_TRUE(eventually([] { return exists("/probe/pause_100"); }));
+  ASSERT_EVENTUALLY(exists("/probe/pause_100"));
   EXPECT_EQ(6u, list(area).size() + 1) << "exactly the limit is left alone";
   auto next_check = [] {
     unlink("/probe/pause_100");
     write_file("/probe/end_pause_100", "");
-    EXPECT_TRUE(eventually([] { return exists("/probe/pause_100"); }));
+    EXPECT_EVENTUALLY(exists("/probe/pause_100"));
   };
   make("below/foreign", 11);
   next_check();

@@ -48,7 +48,7 @@ TEST_F(Thermal, EveryLineTellsTheSourcesOfItsMoment) {
   EXPECT_EQ("", send_commands({"CPUTHERMAL"}));
   const std::string directory = "/data/corvex/KVBR_9_current/kv_tsen_data";
   EXPECT_TRUE(log.has("corvexd: cpu&thermal log path is " + directory + "/ \n"));
-  ASSERT_TRUE(eventually([&] { return lines_of(directory).size() >= 2; }));
+  ASSERT_EVENTUALLY(lines_of(directory).size() >= 2);
   std::string line = lines_of(directory)[0];
   const std::string time = line.substr(strlen("datetime="), line.find(',') - strlen("datetime="));
   EXPECT_EQ(time.find('_'), list(directory)[0].find('_')) << time;
@@ -86,15 +86,14 @@ TEST_F(Thermal, StopEndsTheLatestSamplerOnly) {
   EXPECT_EQ(0u, directory.find("/data/corvex/KVBR_1--")) << "made, as there was none";
   usleep(1'100'000);  // a file is named by its second
   send_commands({"CPUTHERMAL"});
-  ASSERT_TRUE(eventually([&] { return list(directory).size() == 2; }));
+  ASSERT_EVENTUALLY(list(directory).size() == 2);
   send_commands({"STOPCPUTHERMAL", "STOPCPUTHERMAL"});
-  EXPECT_TRUE(eventually([&] { return log.count("stop_logcat : 1, pid = ") > 0; }));
+  EXPECT_EVENTUALLY(log.count("stop_logcat : 1, pid = ") > 0);
   const std::string first = directory + "/" + list(directory)[0];
   const std::string second = directory + "/" + list(directory)[1];
   const size_t first_size = read_file(first).size(), second_size = read_file(second).size();
-  EXPECT_TRUE(eventually([&] {
-    return (read_file(first).size() > first_size) + (read_file(second).size() > second_size) == 1;
-  }));
+  EXPECT_EVENTUALLY(
+      (read_file(first).size() > first_size) + (read_file(second).size() > second_size) == 1);
   usleep(100'000);
   EXPECT_TRUE(read_file(first).size() == first_size || read_file(second).size() == second_size);
 }
