@@ -150,14 +150,6 @@ TEST_F(Client, SaysWhenAnAnswerIsNone) {
   EXPECT_NE(std::string::npos, err_.find("no reply of the daemon")) << err_;
 }
 
-TEST_F(Client, ListsItsWordsAndOptions) {
-  EXPECT_EQ(0, call(" --list"));
-  EXPECT_EQ(16, std::count(out_.begin(), out_.end(), '\n'));
-  EXPECT_NE(std::string::npos, out_.find("LOGSTOP                end the capture\n")) << out_;
-  EXPECT_EQ(0, call(" --help"));
-  EXPECT_EQ(0u, out_.find("usage: ")) << out_;
-}
-
 TEST_F(Client, TellsWhatBecameOfItsWordsThoughNobodyCanReadTheAnswer) {
   const auto serve = [](int connection) {
     read_to_end(connection);
@@ -177,6 +169,14 @@ TEST_F(Client, OutlivesADaemonThatGoesAwayAtOnce) {
   EXPECT_EQ(4, call_with(serve, " DELETELOG $(yes OEM_GPS_DEBUG_DISABLE | head -n 20000)"));
   EXPECT_EQ("CLEANFAILED\n", out_);
   EXPECT_EQ(1, std::count(err_.begin(), err_.end(), '\n')) << err_;
+}
+
+TEST_F(Client, SaysWhenTheDaemonHasHeardEnough) {
+  const auto serve = [](int connection) {
+    shutdown(connection, SHUT_WR);
+    usleep(300'000);
+  };
+  EXPECT_EQ(4, call_with(serve, " $(yes OEM_GPS_DEBUG_DISABLE | head -n 20000)"));
 }
 
 TEST_F(Client, SendsNothingWhenItIsUsedWrongly) {

@@ -10,6 +10,7 @@
 #include <functional>
 #include <map>
 #include <mutex>
+#include <set>
 #include <sstream>
 #include <thread>
 
@@ -112,11 +113,13 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
        {"media/TIME/i.264:h\n", "media/TIME/k.yuv:j\n"}},
       {"echo n > /data/tombstones/other; echo o > /data/m; mv /data/m /data/anr/m", {}},
   };
+  std::set<std::string> paths = {"fileAfter911", "getprop.txt", "versionNumber", "dropbox/m"};
   for (const auto& row : rows) {
     run(row.commands);
     for (const std::string& place : row.places) {
       const std::string path = place.substr(0, place.find(':'));
       const std::string content = place.substr(place.find(':') + 1);
+      paths.insert(path);
       EXPECT_TRUE(eventually([&] {
         auto files = files_below(current);
         return files.count(path) == 1 && files[path] == content;
@@ -124,13 +127,16 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
           << " is " << files_below(current)[path];
     }
   }
+  std::set<std::string> found;
+  for (const auto& [path, content] : files_below(current)) found.insert(path);
+  EXPECT_EQ(paths, found);
   EXPECT_EQ(seconds += 3, pauses(1)) << "for two names of traces and the directory named raw";
   write_file("/data/misc/display/raw_1", "r");
   EXPECT_EVENTUALLY(files_below(current)["rawdata/raw_1/raw_1"] == "rr")
       << "once for its creation, once for its modification";
   EXPECT_EQ(seconds += 2, pauses(1));
   EXPECT_EQ("0", property("debug.sf.dump"));
-  EXPECT_TRUE(exists("/data/corvex/.nomedia"));
+  EXPECT_EQ(0644u, mode_of("/data/corvex/.nomedia"));
   EXPECT_EQ(owners_work(), is_systems("/data/corvex/.nomedia"));
   EXPECT_TRUE(log.has("corvexd: open file failure. /data/system/dropbox/m"))
       << "a move is taken for dropbox's, whatever directory it came into";
@@ -176,7 +182,7 @@ TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
   Observer daemon(log);
   const std::string current = current_directory();
   log.clear();
-  run("cd /data; ln -s /probe/new corvex/.nomedia; mkdir -p raw_dir coredump/elsewhere; "
+  run("cd /data; ln -s /probe/new corvex/.nomedia; mkdir -p raw_dir/below coredump/elsewhere; "
       "echo r > raw_dir/file; ln -s /probe/secret raw_dir/link; mv raw_dir misc/display; "
       "mkdir misc/display/raw_dir_2; mv misc/display/raw_dir/* misc/display/raw_dir_2; "
       "mkdir media/0/Pictures/Screenshots; cd coredump; ln -s /probe/secret core_link; ln "
@@ -190,6 +196,7 @@ TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
             list(current + "/coredump"));
   EXPECT_TRUE(log.has("corvexd: open file failure. /data/misc/display//raw_dir_2/link"));
   EXPECT_EQ("r\n", files_below(current)["rawdata/raw_dir_2/file"]);
+  EXPECT_EQ((Texts{"file", "link"}), list(current + "/rawdata/raw_dir_2"));
   write_file("/data/media/0/Pictures/Screenshots/Screenshot_1", "shot");
   EXPECT_EVENTUALLY(files_below(current)["Screenshots/Screenshot_1"] == "shot");
   EXPECT_FALSE(exists("/probe/new"));
@@ -217,6 +224,13 @@ TEST_F(Collect, WhatHasNoPlaceIsSaid) {
   run("mkdir /data/corvex/a_current");
   EXPECT_EQ(0, movefile("/data/misc/display/", std::string(240, 'r').c_str()));
   EXPECT_EQ(1u, log.count("corvexd: open file failure. /data/misc/display//rrr"));
+
+  LOG_DIR.set(Path());
+  ObserverState state;
+  const std::string created = record(IN_CREATE, "anr_1");
+  handle_events(state, created.data(), created.size());
+  copy_folder("/data/anr/", "/anr/");
+  EXPECT_FALSE(exists("/anr")) << "before the first capture";
 }
 
 // The listing has an order of its own.

@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <signal.h>
 #include <stdlib.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <time.h>
 #include <unistd.h>
@@ -140,10 +141,6 @@ TEST_F(Core, NamesTellTheLocalTime) {
     setenv("TZ", row.zone, 1);
     time_now = row.now;
     EXPECT_STREQ(row.name, local_timestamp().c_str());
-    char standard[32];
-    const struct tm local = local_time();
-    strftime(standard, sizeof standard, "%Y-%m-%d-%H-%M-%S", &local);
-    EXPECT_STREQ(row.name, standard);
     run("rm -rf /data/thermal && mkdir /data/thermal");
     const pid_t sampler = fork();
     if (sampler == 0) record_cpux_thermal("/data/thermal/", 0);
@@ -155,6 +152,22 @@ TEST_F(Core, NamesTellTheLocalTime) {
   }
   time_now = 0;
   unsetenv("TZ");
+}
+
+TEST_F(Core, ADirectoryThatCannotBeListedIsClosed) {
+#ifdef CORVEX_NOISY_MEMORY
+  GTEST_SKIP() << "A sanitizer or an emulator takes memory of its own.";
+#endif
+  EXPECT_EQ(0, status_in_child([] {
+              const struct rlimit none = {0, 0};
+              setrlimit(RLIMIT_AS, &none);
+              void* volatile last;
+              do last = malloc(1);
+              while (last != nullptr);
+              const int lowest = dup(0);
+              close(lowest);
+              _exit(open_directory("/data") == nullptr && dup(0) == lowest ? 0 : 1);
+            }));
 }
 
 TEST_F(Core, NoStepOnTheWayIsALink) {

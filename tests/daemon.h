@@ -64,7 +64,7 @@ struct ProbeReport {
 };
 
 // Puts the probe at the recorders' paths, in the given mode: "live", "die" at once, "brief" (end
-// after some milliseconds) or "stubborn" (ignore SIGTERM).
+// after some milliseconds) or "stubborn" (end at the second SIGTERM).
 void install_probes(const std::string& mode);
 
 // Forgets every report so far.

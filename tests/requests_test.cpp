@@ -42,7 +42,7 @@ TEST_F(Requests, ADumpThatIsKilledIsReported) {
   Daemon daemon(log);
   send_commands({"BUGREPORT"});
   EXPECT_TRUE(log.has("corvexd: no current log directory for bugreport\n"));
-  send_commands({"LOGBEGIN"});
+  send_commands({"LOGBEGIN", "BUGREPORT"});  // there is no such tool, which is no signal
   write_script("/system/bin/bugreport", "exec sleep 60");
   int client = connect_to_daemon();
   send_all(client, message("BUGREPORT") + message("CHANGEPATH"));
@@ -98,6 +98,9 @@ TEST_F(Requests, TagsFollowTheirSwitchesAndCommands) {
     for (const auto& [key, value] : set) EXPECT_EQ(row.level, value) << row.command << key;
   }
   EXPECT_EQ("1", property("persist.oem.nfc.debug"));
+  // Every letter counts: the components look for exactly these names.
+  run("[ $(LC_ALL=C ls /dev/__properties__ | grep ^log.tag | md5sum | cut -c 1-32) = "
+      "ab2a3ddda0bdf84b2d536ffb36022232 ]");
 
   install_probes("die");
   send_commands({"CACHECLEAR"});

@@ -25,7 +25,6 @@ bool listens() {
 
 TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
   run("mkdir -p /vendor/etc && echo '/dev/d /data ext4 ro encryptable=x' > /vendor/etc/fstab.qcom");
-  set_property("persist.sys.lograw", "long");
   set_property("persist.sys.assert.panic", "1");  // which is not "true"
   BootingDaemon daemon;
   const std::string layout_line = "corvexd: installd fs upgrade not yet complete. Waiting...\n";
@@ -49,6 +48,7 @@ TEST_F(Startup, GoesItsWayOnADeviceThatIsNotEncrypted) {
     EXPECT_FALSE(listens());
   }
   EXPECT_GT(pauses(1), 2u * std::size(others));
+  set_property("persist.sys.lograw", "long");  // nobody has asked for it until now
   set_property("vold.internalSD.mount", "A");
   ASSERT_TRUE(eventually(listens));
   const std::string boot = "logcat -f /cache/boot_log/";
@@ -129,7 +129,7 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   set_property("persist.sys.assert.panic", "true");
   switch_on({"qxdm", "radio"});
   set_property("persist.sys.radio.logsize", "5");
-  write_file("/cache/boot_log_old", "");
+  write_script("/system/bin/getprop", "grep corvexd /proc/net/unix");
   BootingDaemon daemon;
   const std::pair<std::string, std::string> wanted("ctl.start", "diag_mdlog_start");
   ASSERT_TRUE(eventually([&] {
@@ -140,12 +140,15 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   EXPECT_EQ("logcat -f " + directory + "/radio.log -r 5 -n 5 -b radio -v threadtime *:V ''",
             command_lines(probe_reports(5)).back());
   EXPECT_TRUE(log.has("start diag_mdlog_start"));
+  EXPECT_NE(std::string::npos, read_file(directory + "/getprop.txt").find(" 00010000 "))
+      << "the socket listens before the capture begins";
 
   // The minute ends: the boot recorders with it, and their files come into the capture.
   write_file("/cache/boot_log/android_boot.log", "boot");
   write_file("/cache/boot_log/radio_boot.log.1.pre", "before");
   ASSERT_EVENTUALLY(exists("/probe/pause_60"));
   EXPECT_EQ(0u, log.count("executeOnBootLogcat stop"));
+  set_property("persist.sys.assert.panic", "false");  // after it has counted
   // Whoever pauses as long may take the sign first.
   EXPECT_TRUE(eventually([&] {
     write_file("/probe/end_pause_60", "");
