@@ -207,6 +207,7 @@ TEST_F(Capture, LogstopEndsWhatIsSwitchedOnThen) {
 
 TEST_F(Capture, RecordersDoNotWaitForTheCopiesOfEarlierLogs) {
   switch_on({"main"});
+  run("mkdir /data/anr");
   std::unique_lock<std::mutex> copies_wait(current_directory_mutex);
   std::thread capture(executeLogcat);
   EXPECT_EQ("main", probe_reports(1)[0].arguments[8]);

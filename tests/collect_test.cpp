@@ -1,5 +1,6 @@
 // What is collected while persistent capture is on.
 #include <fcntl.h>
+#include <signal.h>
 #include <string.h>
 #include <sys/inotify.h>
 #include <sys/stat.h>
@@ -127,9 +128,12 @@ TEST_F(Collect, EveryArtefactComesToItsPlace) {
           << " is " << files_below(current)[path];
     }
   }
-  std::set<std::string> found;
-  for (const auto& [path, content] : files_below(current)) found.insert(path);
-  EXPECT_EQ(paths, found);
+  auto collected = [&] {
+    std::set<std::string> found;
+    for (const auto& [path, content] : files_below(current)) found.insert(path);
+    return found;
+  };
+  EXPECT_EVENTUALLY(collected() == paths) << testing::PrintToString(collected());
   EXPECT_EQ(seconds += 3, pauses(1)) << "for two names of traces and the directory named raw";
   write_file("/data/misc/display/raw_1", "r");
   EXPECT_EVENTUALLY(files_below(current)["rawdata/raw_1/raw_1"] == "rr")
@@ -182,12 +186,14 @@ TEST_F(Collect, NothingButFilesOfTheWatchedDirectoriesIsCollected) {
   Observer daemon(log);
   const std::string current = current_directory();
   log.clear();
+  kill(daemon.pid(), SIGSTOP);  // who makes a directory fills it later
   run("cd /data; ln -s /probe/new corvex/.nomedia; mkdir -p raw_dir/below coredump/elsewhere; "
       "echo r > raw_dir/file; ln -s /probe/secret raw_dir/link; mv raw_dir misc/display; "
       "mkdir misc/display/raw_dir_2; mv misc/display/raw_dir/* misc/display/raw_dir_2; "
       "mkdir media/0/Pictures/Screenshots; cd coredump; ln -s /probe/secret core_link; ln "
       "/probe/secret core_hard; "
       "mkfifo core_fifo; ln -s elsewhere core_folder; echo core > core_file");
+  kill(daemon.pid(), SIGCONT);
   EXPECT_EVENTUALLY(files_below(current)["coredump/core_file"] == "core\n");
   for (const char* name : {"core_link", "core_hard", "core_folder"}) {
     EXPECT_TRUE(log.has(std::string("corvexd: open file failure. /data/coredump//") + name));

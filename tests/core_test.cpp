@@ -166,7 +166,9 @@ TEST_F(Core, ADirectoryThatCannotBeListedIsClosed) {
               while (last != nullptr);
               const int lowest = dup(0);
               close(lowest);
-              _exit(open_directory("/data") == nullptr && dup(0) == lowest ? 0 : 1);
+              _exit(open_directory("/data") == nullptr && dup(0) == lowest && dup(0) == lowest + 1
+                        ? 0
+                        : 1);
             }));
 }
 

@@ -129,7 +129,7 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   set_property("persist.sys.assert.panic", "true");
   switch_on({"qxdm", "radio"});
   set_property("persist.sys.radio.logsize", "5");
-  write_script("/system/bin/getprop", "grep corvexd /proc/net/unix");
+  write_script("/system/bin/getprop", "/build/client/corvexctl CHANGEPATH; echo $?");
   BootingDaemon daemon;
   const std::pair<std::string, std::string> wanted("ctl.start", "diag_mdlog_start");
   ASSERT_TRUE(eventually([&] {
@@ -140,7 +140,7 @@ TEST_F(Startup, PersistentCaptureRunsBeforeTheFirstCommand) {
   EXPECT_EQ("logcat -f " + directory + "/radio.log -r 5 -n 5 -b radio -v threadtime *:V ''",
             command_lines(probe_reports(5)).back());
   EXPECT_TRUE(log.has("start diag_mdlog_start"));
-  EXPECT_NE(std::string::npos, read_file(directory + "/getprop.txt").find(" 00010000 "))
+  EXPECT_EVENTUALLY(read_file(directory + "/getprop.txt") == "0\n")
       << "the socket listens before the capture begins";
 
   // The minute ends: the boot recorders with it, and their files come into the capture.
