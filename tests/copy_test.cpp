@@ -1,8 +1,10 @@
 #include "storage/copy.h"
 
 #include <fcntl.h>
+#include <signal.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -57,14 +59,19 @@ TEST_F(Copy, NeitherAFifoNorAFullDiskHoldsItUp) {
   // One that is filled up as fast as it is read has no end.
   std::atomic<bool> done{false};
   std::thread feeder([&] {
-    const std::string much(65536, 'f');
-    fcntl(both_ends, F_SETFL, O_NONBLOCK);
-    while (!done) write(both_ends, much.data(), much.size());
+    const std::string page(4096, 'f');
+    while (!done) write(both_ends, page.data(), page.size());
   });
-  usleep(10'000);
+  usleep(20'000);
+  signal(SIGALRM, [](int) { usleep(1000); });  // the one who copies is the slower
+  const struct itimerval often = {{0, 100}, {0, 100}}, never = {};
+  setitimer(ITIMER_REAL, &often, nullptr);
   EXPECT_EQ(1, copy_file("/data/from/fifo", "/data/log/endless"));
+  setitimer(ITIMER_REAL, &never, nullptr);
   EXPECT_LE(read_file("/data/log/endless").size(), 65536u) << "what it held";
   done = true;
+  fcntl(both_ends, F_SETFL, O_NONBLOCK);
+  read_to_end(both_ends);  // the feeder may be waiting for room
   feeder.join();
   close(both_ends);
   mkfifo("/data/log/sink", 0600);
