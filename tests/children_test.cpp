@@ -94,6 +94,9 @@ TEST_F(Children, NoSignalReachesARecycledNumber) {
   start_child(slots[0], live, nullptr);
   terminate_child(slots[0]);
   EXPECT_TRUE(log.has("corvexd: stop_logcat : 1, pid = " + std::to_string(slots[0].pid) + "\n"));
+  errno = EDOM;
+  raise(SIGCHLD);
+  EXPECT_EQ(EDOM, errno) << "whoever is interrupted keeps its own";
 }
 
 TEST_F(Children, AForkThatFailsLeavesNobodyToSignal) {
