@@ -27,8 +27,8 @@ void run_recorder(const void* argument) {
   start.recorder->run(*start.switches);
 }
 
-// The two switches of the android recorder were read before the properties were dumped; every other
-// one counts as it stands when its turn comes.
+// The android recorder uses the two switches that were read before the properties were dumped.
+// Every other switch is read when its recorder's turn comes.
 bool should_start(const Recorder& recorder, const CaptureSwitches& switches) {
   if (recorder.slot == &android_pid) return switches.main || switches.system;
   return switched_on(recorder.switches[0]);

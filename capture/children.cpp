@@ -17,15 +17,16 @@
 //
 // - Slots are read and written, children reaped and signals sent under one spin lock. It is taken
 //   with SIGCHLD blocked on the taking thread, so the handler never waits for the thread that it
-//   interrupted, and nobody who holds it blocks: a slot that says "running" cannot lose its child
-//   between the test and the kill.
+//   interrupted. Its holder never blocks. A slot that says "running" cannot lose its child between
+//   the test and the kill.
 // - It is never held across fork(). The C library takes its allocation locks there; a thread
 //   interrupted inside an allocation would otherwise spin in the handler for a lock whose owner
 //   waits for that very allocation.
-// - Between a fork and the storing of its result nobody can tell which slot a child belongs to.
-//   Deliveries of that moment are counted and carried out by the starter right afterwards, so a
-//   child that ends at once is still found in its slot. Two threads start children; each holds the
-//   mutex over the local time for it, so one start ends before the next begins.
+// - Between a fork and the storing of its result, no slot names the child. SIGCHLDs that arrive
+// then
+//   are counted, and the starter handles them right afterwards: a child that ends at once is still
+//   found in its slot. Two threads start children. Each holds the mutex over the local time while
+//   it does, so one start ends before the next begins.
 
 namespace corvexd {
 namespace {
@@ -72,7 +73,7 @@ void reset_after_fork() {
   slots_locked.clear(std::memory_order_release);
 }
 
-// Ends the start: stores the fork's result and returns how many deliveries waited for it.
+// Ends the start: stores the fork's result and returns how many SIGCHLDs arrived meanwhile.
 int end_start(ChildSlot& slot, pid_t result) {
   SlotLock lock;
   slot.pid = result;
@@ -88,7 +89,7 @@ void mark_ended(ChildSlot& slot, int status) {
   slot.status = status;
 }
 
-// Reaps one child, if one has ended and its slot can be told; false when it is put off.
+// Reaps one ended child, if there is one. False when a start is under way and it must wait.
 bool reap_one(pid_t* reaped) {
   SlotLock lock;
   if (starting) {
@@ -110,8 +111,8 @@ void on_sigchld() {
   log_error("corvexd: stop_logcat : %d, pid = %d\n", stop_logcat.load(), reaped);
 }
 
-// Ends that came together were delivered as one, and each delivery reaps one child. Without this
-// the rest would pile up, capture after capture.
+// Each SIGCHLD reaps one child, but the kernel merges SIGCHLDs that arrive together. Without this
+// the zombies that are left over would pile up, capture after capture.
 void reap_merged_ends() {
   siginfo_t ended = {};
   while (waitid(P_ALL, 0, &ended, WEXITED | WNOHANG | WNOWAIT) == 0 && ended.si_pid != 0) {
@@ -146,8 +147,8 @@ void exec_program(const char* path, const char* const* arguments) {
 }
 
 int wait_for_child(ChildSlot& slot) {
-  // Waited for without reaping, then reaped under the lock. When the handler was faster, it has
-  // left the status in the slot.
+  // Wait without reaping, then reap under the lock. If the handler reaped the child first, the slot
+  // holds its status.
   siginfo_t info;
   TEMP_FAILURE_RETRY(waitid(P_PID, slot.pid, &info, WEXITED | WNOWAIT));
   SlotLock lock;

@@ -19,9 +19,9 @@ struct ChildSlot {
 // Forks. The child runs body(argument) and ends with status 1 if that returns; it must not return
 // into the starter's sequence in any other way, nor wait for a lock that another thread may hold
 // (allocation and local_timestamp are safe). The parent does not wait; the result of the fork is
-// in the slot (errno is the fork's), whose earlier child, if any, goes on unobserved. Children that
-// have ended are reaped first, as by one delivery of SIGCHLD each. Any thread; a slot belongs to
-// one.
+// in the slot (errno is the fork's). The slot forgets its earlier child, which goes on. Children
+// that have ended are reaped first, as by one SIGCHLD each. Any thread; each slot belongs to one
+// thread.
 void start_child(ChildSlot& slot, void (*body)(const void*), const void* argument);
 
 // Replaces the calling child by a program with the daemon's environment; ends it with status 1
@@ -36,10 +36,10 @@ int wait_for_child(ChildSlot& slot);
 // another process. Any thread.
 void terminate_child(ChildSlot& slot);
 
-// Empties a slot that names a child; that child, if it runs, goes on unobserved. Any thread.
+// Empties the slot: its child, if it still runs, goes on without being watched. Any thread.
 void forget_child(ChildSlot& slot);
 
-// The SIGCHLD handler: reaps one ended child, whichever, and logs it.
+// The SIGCHLD handler: reaps one ended child, any of them, and logs it.
 void sig_chld_handler(int signal);
 
 // Installs sig_chld_handler. Every starter does so before its first child.

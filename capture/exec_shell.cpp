@@ -40,7 +40,7 @@ void run_shell(const void* argument) {
 
 void use_as_output(int fd) {
   dup2(fd, STDOUT_FILENO);
-  fcntl(STDOUT_FILENO, F_SETFD, 0);  // should it have been this descriptor already
+  fcntl(STDOUT_FILENO, F_SETFD, 0);  // dup2 leaves the flag set if fd is standard output already
 }
 
 bool start_shell(ChildSlot& slot, const char* command, unique_fd output) {
@@ -67,7 +67,7 @@ void exec_shell(const char* command, const char* name) {
   }
   if (!line.append("&").fits_or_log()) return;
 
-  // What the line says, but that the file is opened and given away here.
+  // Does what the line says, but the daemon opens the file and changes its owner itself.
   unique_fd file = open_program_output(output.c_str());
   if (file != -1) give_to_system(file);
   if (start_shell(dump_slot, started.c_str(), std::move(file))) sleep_seconds(kHeadStart);

@@ -11,14 +11,14 @@ namespace corvexd {
 void use_as_output(int fd);
 
 // Starts `command` in a shell, a child in this slot, with `output` as its standard output. The
-// command line holds no name but the daemon's own, and no file's at all: the shell would open
-// whatever somebody has put there. Any thread. Waits for nothing; false when the fork failed. An
-// output that could not be opened (errno says why) is told as a shell would, on standard error.
+// command line names no file: the shell would follow a link that somebody has put there. Any
+// thread. Does not wait; false when the fork failed. If `output` could not be opened (errno says
+// why), that is reported on standard error, as a shell does.
 bool start_shell(ChildSlot& slot, const char* command, android::base::unique_fd output);
 
 // Runs `command` through the shell with its output in the file `name` of LOG_DIR, given to the
 // system user while the log root lies in the data partition. Main thread. Returns after about one
-// second; the command may still be writing then, and how it ends is not looked at.
+// second. The command may still be writing then; its exit status is ignored.
 void exec_shell(const char* command, const char* name);
 
 }  // namespace corvexd

@@ -56,7 +56,7 @@ void log_lost_output(const NodeReader& reader, const char* path, int error) {
   }
 }
 
-// A file that has been removed under the reader takes the bytes of its last write along.
+// If the output file has been removed, the bytes of the last write are lost with it.
 void replace_lost_output(const NodeReader& reader, const char* path) {
   if (access(path, reader.is_kernel_log ? F_OK : R_OK) == 0) return;
   log_lost_output(reader, path, errno);
@@ -112,9 +112,9 @@ void copy_block(const NodeReader& reader, const char* path, const char* block, s
 
 void copy_source(const NodeReader& reader, const char* path) {
   Counters counters;
-  // Not NUL, so that the line says what happened when nothing has been read at all.
+  // Not NUL: when the first read fails, the log must say that, and not that the area is empty.
   char block[kBlockSize] = {'\xff'};
-  // A source that stays empty is read more often than an int can tell.
+  // An int would overflow: a source that stays empty is read again and again.
   for (int64_t reads = 0; reader.max_reads == 0 || reads < reader.max_reads; ++reads) {
     ssize_t size = read(*reader.from_fd, block, sizeof block);
     if (reader.erases_source && block[0] == '\0') {

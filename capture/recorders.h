@@ -23,7 +23,7 @@ extern ChildSlot tz_pid;
 extern ChildSlot bootloader_pid;
 extern ChildSlot pre_bootloader_pid;
 
-// The source and output of the daemon's own readers: -1, but in the reader's own process.
+// The source and output of the daemon's own readers. They are -1 except in the reader's process.
 extern int32_t kernel_from_fd, kernel_to_fd;
 extern int32_t qsee_from_fd, qsee_to_fd;
 extern int32_t tz_from_fd, tz_to_fd;

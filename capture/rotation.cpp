@@ -35,7 +35,7 @@ void shift_series(const Place& place, int count, bool owned) {
         renameat(place.folder, old_name.c_str(), place.folder, new_name.c_str()) == 0;
     if (!renamed) complain();
     if (owned) {
-      // A name that was just renamed away has no file to give.
+      // A name that was just renamed has no file any more.
       if (!renamed) give_to_system_at(place.folder, old_name.c_str());
       give_to_system_at(place.folder, new_name.c_str());
     }

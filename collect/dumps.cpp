@@ -26,8 +26,8 @@ constexpr char kRedirection[] = " > ";
 ChildSlot bugreport_slot;
 ChildSlot clear_slot;
 
-// The line says where the report goes. What opens that file is not the shell, which would follow
-// whatever somebody has put there, but this child, before it hands its output to the tool.
+// The line says where the report goes. This child opens that file itself, before it starts the
+// tool: the shell would follow a link that somebody has put there.
 void run_bugreport(const void* command_line) {
   const char* line = static_cast<const char*>(command_line);
   const char* path = strstr(line, kRedirection) + strlen(kRedirection);

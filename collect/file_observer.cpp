@@ -50,7 +50,7 @@ constexpr Watch kWatches[] = {
     {"/data/vendor/media/", IN_MODIFY | IN_CLOSE_WRITE | IN_MOVED_TO | IN_CREATE},
 };
 
-// Where a file that was closed after writing is to be found, by its name; the first match counts.
+// The directory of a file that was closed after writing, by its name. The first match counts.
 struct ClosedArtefact {
   const char* in_name;
   const char* directory;
@@ -62,7 +62,7 @@ constexpr ClosedArtefact kClosedArtefacts[] = {
     {"yuv", "/data/vendor/media/"},    {"264", "/data/vendor/media/"},
 };
 
-// What the kernel knew of binder calls at the moment of a trace.
+// The kernel's state of binder calls, copied when a trace appears.
 struct BinderState {
   const char* source;
   const char* name;
@@ -80,8 +80,8 @@ bool holds(const char* name, const char* part) { return strstr(name, part) != nu
 
 bool is_trace(const char* name) { return holds(name, "trace") || holds(name, "anr_"); }
 
-// Opens the directory of the latest trace. A capture that has begun since then has taken the mark
-// away from the log directory above it.
+// Opens the directory of the latest trace. If a capture has begun since, the log directory above it
+// has lost the mark and so has another name.
 unique_fd open_anr_directory(LongPath* path) {
   std::lock_guard<std::mutex> lock(current_directory_mutex);
   unique_fd folder = open_folder(path->c_str());
@@ -123,7 +123,7 @@ void dump_input(int folder, const LongPath& directory) {
 
 void begin_trace(ObserverState& state, const char* name) {
   log_error("corvexd: traces: %s", name);
-  // Before the first capture there is no log directory, and nothing is to be made elsewhere.
+  // Before the first capture there is no log directory, and nothing may be made elsewhere.
   if (LOG_DIR.get().empty()) return;
   LongPath directory;
   unique_fd folder;

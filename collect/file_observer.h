@@ -18,7 +18,7 @@ struct Event {
   char name[NAME_MAX + 1];
 };
 
-// The events with a name in one read's worth of inotify records, however they are torn.
+// Iterates over the named events in the inotify records of one read. The records may be cut off.
 class EventReader {
  public:
   EventReader(const char* records, size_t size) : next_(records), left_(size) {}
@@ -31,13 +31,13 @@ class EventReader {
   size_t left_;
 };
 
-// What the observer knows between events.
+// The observer's state between events.
 struct ObserverState {
   int inotify_fd = -1;
   LongPath anr_directory;  // of the latest trace; empty before the first
 };
 
-// Acts on one read's worth of inotify records, however they are torn. Observer thread.
+// Handles the inotify records of one read, which may be cut off. Observer thread.
 void handle_events(ObserverState& state, const char* records, size_t size);
 
 }  // namespace corvexd

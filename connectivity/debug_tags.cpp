@@ -28,7 +28,7 @@ constexpr const char* kNfcTags[] = {
 };
 static_assert(sizeof kNfcTags / sizeof *kNfcTags == 12, "every tag is there");
 
-// The one that seems cut is: a property name ends after 31 characters.
+// One name looks cut, and is: a property name has at most 31 characters.
 constexpr const char* kLocationTags[] = {
     "log.tag.GnssLocationProvider",
     "log.tag.LocationManagerService",

@@ -12,8 +12,8 @@ void set_gps_android_log(int enable);
 // Applies the levels that the persistent switches ask for, once.
 void set_connectivit_android_log();
 
-// Thread body: applies them eight times in the first seconds after start, for the tags do not
-// survive a reboot and other start-up code may set them, too.
+// Thread body: applies them eight times in the first seconds after start. The tags do not survive a
+// reboot, and other start-up code may set them, too.
 void* connectivity_log_check(void*);
 
 }  // namespace corvexd

@@ -13,7 +13,7 @@ ChildSlot sniff_stop_pid;
 
 namespace {
 
-// What the driver needs between being told to log and being set up for it.
+// The time that the driver needs between the two commands that switch its log on.
 constexpr time_t kSettlingTime = 5;  // seconds
 
 struct Job {

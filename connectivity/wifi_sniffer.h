@@ -11,7 +11,7 @@ extern ChildSlot sniff_start_pid;
 extern ChildSlot sniff_stop_pid;
 
 // Run the tools; a child of the same job that still runs is ended first. Main thread. The start
-// takes about five seconds, the stop returns at once. How the tools end is not looked at.
+// takes about five seconds, the stop returns at once. The tools' exit status is ignored.
 void wifi_snifflog_start();
 void wifi_snifflog_stop();
 

@@ -14,14 +14,14 @@ using android::base::unique_fd;
 namespace corvexd {
 namespace {
 
-// Only the system can replace these, and may have made them links, as it does with the cache of
-// some devices. A path begins with the first that matches; what follows is reached without links.
+// Only the system can replace these. They may be links: on some devices the cache is one. A path
+// begins with the first that matches; no link is followed below it.
 constexpr const char* kSystemDirectories[] = {"/data/", "/cache/", "/kv2/", "/storage/emulated/0/",
                                               "/"};
 
 constexpr int kStepFlags = O_PATH | O_DIRECTORY | O_CLOEXEC;
 
-// Where *path begins; *path is moved past it.
+// The directory that *path begins in; *path is moved past it.
 unique_fd open_start(const char** path) {
   for (const char* directory : kSystemDirectories) {
     const size_t length = strlen(directory);

@@ -1,4 +1,4 @@
-// Directories, reached so that nobody who can write in one of them leads the daemon elsewhere.
+// Safe access to directories that other users can write to: none of them can redirect the daemon.
 #pragma once
 
 #include <android-base/unique_fd.h>
@@ -10,26 +10,25 @@
 
 namespace corvexd {
 
-// A name in an open directory. The daemon reaches through one whatever it makes, changes or
-// deletes.
+// A name in an open directory. The daemon makes, changes and deletes everything through one.
 struct Place {
   android::base::unique_fd folder;  // for names in it only; -1 with errno set: not reached
   char name[NAME_MAX + 1];
 };
 
-// The place that `path` names, whether or not something is there. A "/" at the end changes nothing.
+// The place that `path` names; there need not be anything. A "/" at the end changes nothing.
 // Follows no link below the directories that only the system can replace.
 // The second one takes a path that does not begin with "/" from the open directory `folder`.
 Place locate(const char* path);
 Place locate_from(int folder, const char* path);
 
-// Open a directory, never what a link names: by its path, as locate() finds it, or as an entry of
+// Open a directory without following a link: by its path, as locate() finds it, or as an entry of
 // the directory `parent`. Close-on-exec; -1 with errno set on failure.
 android::base::unique_fd open_folder(const char* path);
 android::base::unique_fd open_folder_at(int parent, const char* name);
 
-// Makes a directory with exactly `mode`, whatever umask the daemon was started with, and opens it.
-// The umask stays as it is: children inherit it. -1 with errno set on failure.
+// Makes a directory with exactly `mode` and opens it. The umask neither counts nor changes:
+// children inherit it. -1 with errno set on failure.
 android::base::unique_fd make_folder(int parent, const char* name, mode_t mode);
 
 struct CloseDirectory {

@@ -10,7 +10,7 @@ std::atomic<int> client_connection{-1};
 
 void exit_daemon() {
   shutdown(client_connection, SHUT_RDWR);
-  // Who is queued belongs to the socket, not to its end; accepting shows them that nobody serves.
+  // The shutdown does not reach clients in the backlog. Accepting and closing ends them, too.
   shutdown(listening_socket, SHUT_RDWR);
   int queued;
   while ((queued = accept4(listening_socket, nullptr, nullptr, SOCK_CLOEXEC)) != -1) close(queued);

@@ -21,7 +21,7 @@ constexpr mode_t kProgramOutputMode = 0666;
 constexpr int kMaxLinks = 8;  // one leading to the next
 constexpr int kSafely = O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
 
-// A second name may be one that somebody has given to another's file.
+// A second name may be a hard link that somebody has made to another user's file.
 bool has_one_name(const struct stat& status) {
   if (status.st_nlink <= 1) return true;
   errno = EMLINK;
@@ -34,7 +34,7 @@ bool is_regular(const struct stat& status) {
   return false;
 }
 
-// Passes the file on when it may be written to.
+// Returns the file if the daemon may write to it, else -1.
 unique_fd checked_output(unique_fd file) {
   struct stat status;
   bool good = file != -1 && fstat(file, &status) == 0 && is_regular(status) && has_one_name(status);
@@ -47,8 +47,8 @@ bool is_copyable(const struct stat& status) {
   return is_regular(status) && has_one_name(status);
 }
 
-// Reads the text of a link that the daemon's own user has made. The text is that of the very link
-// whose owner was looked at, whatever bears its name by now.
+// Reads the text of a link that the daemon's own user has made. It opens the link first, so that
+// the owner and the text are those of the same link.
 bool read_own_link(int folder, const char* name, char (&text)[PATH_MAX]) {
   unique_fd link(openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
   struct stat status;
@@ -86,7 +86,7 @@ unique_fd open_program_output(const char* path) {
 unique_fd open_program_output_at(int folder, const char* name) {
   const int flags = O_WRONLY | O_CREAT | kSafely;
   unique_fd file = checked_output(unique_fd(openat(folder, name, flags, kProgramOutputMode)));
-  // Not before it is known whose file it is.
+  // Only once it is known whose file it is.
   if (file != -1 && ftruncate(file, 0) != 0) return unique_fd();
   return file;
 }

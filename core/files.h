@@ -1,4 +1,4 @@
-// Files that are written, files that are copied, and owners, among files that others can write.
+// Safe access to files where other users can write: output, sources of copies, owners.
 #pragma once
 
 #include <android-base/unique_fd.h>
@@ -11,7 +11,7 @@ namespace corvexd {
 
 // Open a file for writing, with open(2)'s `flags` and O_CREAT. It is a regular file that bears no
 // other name, and no link is followed to it; anything else is a failure. A file that it creates has
-// exactly `mode`, whatever umask the daemon was started with; children inherit that as it is.
+// exactly `mode`; the umask neither counts nor changes.
 android::base::unique_fd open_output(const char* path, int flags, mode_t mode);
 android::base::unique_fd open_output_at(int folder, const char* name, int flags, mode_t mode);
 
@@ -20,8 +20,8 @@ android::base::unique_fd open_output_at(int folder, const char* name, int flags,
 android::base::unique_fd open_program_output(const char* path);
 android::base::unique_fd open_program_output_at(int folder, const char* name);
 
-// Which symbolic links a source may be reached through: none, or those that the daemon's own user
-// has made, if they lead to files and not to directories on the way.
+// Which symbolic links may lead to a source: none, or those that the daemon's own user has made, if
+// they name a file and not a directory on the way.
 enum class Links { kNone, kOwn };
 
 // Opens a file to be copied: a regular file that bears no other name, or a FIFO.

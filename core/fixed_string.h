@@ -9,9 +9,9 @@
 
 namespace corvexd {
 
-// Holds a NUL-terminated text of at most N - 1 characters, on the stack or in static storage. What
-// does not fit is cut, and fits() stays false until the next clear(): a composed path is asked
-// before it is used, so that no cut name is ever opened, renamed or removed.
+// Holds a NUL-terminated text of at most N - 1 characters, on the stack or in static storage. A
+// text that does not fit is cut, and fits() stays false until the next clear(). Ask it before using
+// a composed path, so that no cut name is ever opened, renamed or removed.
 template <size_t N>
 class FixedString {
  public:
@@ -65,8 +65,7 @@ class FixedString {
 constexpr size_t kPathSize = 200;
 using Path = FixedString<kPathSize>;
 
-// For what is cut where it does not fit: an artefact with a very long name is kept under the part
-// that fits.
+// For paths that may be cut: an artefact with a very long name is kept under the part that fits.
 using LongPath = FixedString<256>;
 
 }  // namespace corvexd

@@ -16,9 +16,9 @@ using Timestamp = FixedString<100>;
 struct tm local_time();
 Timestamp local_timestamp();
 
-// The C library keeps its time zone under a lock that a fork copies as it stands. Whoever forks a
-// child that reads the local time holds this mutex meanwhile, so that no other thread is inside.
-// Every use of the local time goes through these two, which take it.
+// The C library guards its time zone with a lock, and a fork copies that lock in the state it has.
+// A thread that forks a child holds this mutex meanwhile, so that no other thread is inside the C
+// library's lock. All uses of the local time go through the two functions above, which take it.
 extern std::mutex local_time_mutex;
 
 }  // namespace corvexd

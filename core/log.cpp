@@ -10,8 +10,8 @@ namespace {
 
 constexpr char kTag[] = "corvexd";
 
-// What one record of the log carries; __android_log_print would cut a line at a quarter of it, and
-// a command with its path is longer than that.
+// The capacity of one log record. __android_log_print would cut a line at a quarter of it, and a
+// command with its path is longer than that.
 constexpr size_t kMaxLine = 4068 - 1 - sizeof kTag;
 
 __attribute__((format(printf, 2, 0))) void write_line(int priority, const char* format,

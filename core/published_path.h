@@ -10,8 +10,8 @@
 namespace corvexd {
 
 // Empty until the first set(). set() runs on the main thread only; get() on any thread, and in a
-// child, returns the text of the last set() or the one before it, never a mixture, and waits for
-// nobody but a set() in progress. Both copy; the object is never released.
+// child, returns the text of the last set() or the one before it, never a mixture, and waits only
+// for a set() in progress. Both copy; the object is never released.
 class PublishedPath {
  public:
   void set(const Path& path);

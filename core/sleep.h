@@ -5,8 +5,8 @@
 
 namespace corvexd {
 
-// Sleeps on the calling thread for the whole time, however many children end meanwhile. The only
-// operation of its unit, so that a test can link a shorter one in its place.
+// Sleeps on the calling thread for the whole time, however many signals arrive meanwhile. It has a
+// file of its own so that a test can link a shorter sleep in its place.
 void sleep_seconds(time_t seconds);
 
 }  // namespace corvexd

@@ -31,8 +31,8 @@ extern PublishedPath LOG_DIR;
 // Where the main thread composes paths under the cache log directory.
 extern Path cache_file_path;
 
-// Chooses the log root anew from its two properties. Main thread. What runs already keeps writing
-// where it was started.
+// Chooses the log root anew from its two properties. Main thread. Running recorders keep writing to
+// the directory in which they were started.
 void checkLogPath();
 
 }  // namespace corvexd

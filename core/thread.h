@@ -3,8 +3,8 @@
 
 namespace corvexd {
 
-// Starts a thread that nobody joins. When it cannot be started, one error line says so and its work
-// is missing.
+// Starts a detached thread. If it cannot be started, one error line says so, and its work is not
+// done.
 void start_thread(void* (*body)(void*));
 
 }  // namespace corvexd

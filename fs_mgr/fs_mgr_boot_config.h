@@ -1,4 +1,4 @@
-// What the bootloader handed to the system, by key.
+// The boot configuration: values that the bootloader passes to the system, by key.
 #pragma once
 
 #include <string>
@@ -11,8 +11,8 @@ bool fs_mgr_get_boot_config(const std::string& key, std::string* out_val);
 // The same from the kernel command line alone; *out_val is left as it was when it holds no value.
 bool fs_mgr_get_boot_config_from_kernel_cmdline(const std::string& key, std::string* out_val);
 
-// What is appended to the names of partitions that exist once for each slot, for example "_a";
-// empty when the device has no slots.
+// The suffix of partitions that exist once for each slot, for example "_a"; empty when the device
+// has no slots.
 std::string fs_mgr_get_slot_suffix();
 
 // The value of the entry "androidboot.<key>" of a command line, when it holds one.

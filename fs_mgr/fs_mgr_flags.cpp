@@ -69,7 +69,7 @@ const flag_list kNamesModes[] = {{"aes-256-cts", 3}, {"aes-256-heh", 4}, {nullpt
 constexpr uint32_t kDefaultContentsMode = 1;
 constexpr uint32_t kDefaultNamesMode = 3;
 
-// Numbers are read at the widest and kept in the width of their field.
+// Numbers are read as the widest type, then converted to the type of their field.
 long long integer(const char* text) { return strtoll(text, nullptr, 0); }
 
 // Makes one of the values' texts a copy of the first `length` characters.

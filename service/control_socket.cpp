@@ -19,7 +19,7 @@ constexpr char kSocketName[] = "corvexd";
 constexpr int kBacklog = 5;
 constexpr int kMaxCommand = 1023;
 
-// Reads one message and runs it; false when the connection is of no more use.
+// Reads one message and runs it; false when the connection has ended or cannot be used any more.
 bool serve_message(int connection) {
   uint16_t length;
   if (readx(connection, &length, sizeof length) != 0) {
@@ -97,7 +97,8 @@ void serve_clients() {
     log_info("new connection\n");
     serve_connection(connection);
     log_info("closing connection\n");
-    // Readers forked meanwhile hold a copy of the descriptor; the client is to see the end now.
+    // Readers that were forked meanwhile hold a copy of the descriptor. The client must see the end
+    // now.
     shutdown(connection, SHUT_RDWR);
     client_connection = -1;
     close(connection);

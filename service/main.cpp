@@ -12,8 +12,8 @@
 
 namespace corvexd {
 
-// The start-up order: the boot recorders first, for the first lines of a boot are the ones that
-// matter; the data partition only when it can be used.
+// The start-up order: the boot recorders come first, because the first lines of a boot matter most.
+// The data partition is touched only when it can be used.
 [[noreturn]] static void run() {
   log_info("corvexd main start\n");
   choose_cache_directory();

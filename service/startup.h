@@ -1,4 +1,4 @@
-// The steps of the way from power-on to serving.
+// The steps of start-up, from power-on to serving.
 #pragma once
 
 namespace corvexd {
@@ -6,7 +6,7 @@ namespace corvexd {
 // "/kv2/" where it can be read, else "/cache/".
 void choose_cache_directory();
 
-// Whether the fstab says that the data partition is encrypted whatever the user wants.
+// Whether the fstab forces encryption of the data partition.
 bool data_is_force_encrypted();
 
 // Wait, without limit, until installd has laid out the data partition, and until the partition can

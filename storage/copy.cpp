@@ -24,7 +24,7 @@ constexpr mode_t kFileMode = 0644;
 constexpr mode_t kFolderMode = 0777;
 
 void copy_content(int from, int to) {
-  // What a FIFO holds and no more, however fast it is filled up again.
+  // Of a FIFO, read only as much as it can hold: its writer may fill it up again without end.
   const int capacity = fcntl(from, F_GETPIPE_SZ);
   int64_t left = capacity == -1 ? INT64_MAX : capacity;
   char chunk[kChunkSize];
@@ -37,8 +37,8 @@ void copy_content(int from, int to) {
   }
 }
 
-// Opens the directory `path`, made when missing; -1 when it cannot be. Kept open, it takes the
-// copies even after a new capture has renamed what it lies in.
+// Opens the directory `path`, and makes it when it is missing; -1 on failure. Copies go through the
+// open directory, so they arrive even after a new capture has renamed the directory above it.
 unique_fd open_or_make_folder(const char* path) {
   const Place place = locate(path);
   unique_fd folder;
@@ -87,7 +87,7 @@ void copy_folder(const char* src_dir, const char* sub) {
   if (!source) return;
   std::unique_lock<std::mutex> lock(current_directory_mutex);
   Path path = LOG_DIR.get();
-  // Before the first capture there is no log directory, and nothing is to be made elsewhere.
+  // Before the first capture there is no log directory, and nothing may be made elsewhere.
   const bool is_known = !path.empty();
   if (!path.append(sub).fits_or_log()) return;
   const unique_fd folder = is_known ? open_or_make_folder(path.c_str()) : unique_fd();

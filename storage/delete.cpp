@@ -39,8 +39,8 @@ bool close_listing(Directory directory, const char* path) {
   return false;
 }
 
-// Removes the entry `name` of the directory `parent`; the path is what the log calls it. Going down
-// by descriptors, the walk cannot be led elsewhere by whoever swaps a directory for a link.
+// Removes the entry `name` of the directory `parent`; the path is for the log. The walk goes
+// down by descriptors: a directory that is swapped for a link cannot redirect it.
 int remove_entry(int parent, const char* name, const char* path) {
   struct stat status;
   if (fstatat(parent, name, &status, AT_SYMLINK_NOFOLLOW) != 0) {

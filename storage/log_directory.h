@@ -17,7 +17,8 @@ void renameLastDirectoryName();
 // one the daemon is of no use, and init starts it again.
 int createLogDirectory();
 
-// The two in one, so that no artefact finds no mark, or two: what every capture begins with.
+// Both as one step, so that an artefact always finds exactly one mark. Every capture begins with
+// it.
 void begin_log_directory();
 
 // The directory that bears the mark, made when there is none. Main thread.

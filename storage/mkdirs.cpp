@@ -16,7 +16,7 @@ namespace {
 constexpr int kWorkingSize = 512;
 constexpr mode_t kMode = 0755;
 
-// What cannot be asked for may still be there to be opened.
+// access() may fail for a directory that can be opened all the same.
 bool exists(const char* path) { return access(path, F_OK) == 0 || open_directory(path); }
 
 // -1 (logged) on failure.

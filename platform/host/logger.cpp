@@ -19,17 +19,17 @@ namespace {
 constexpr char kTag[] = "corvexd";
 constexpr size_t kMaxPayload = 4068;  // priority, tag and NUL, text and NUL together
 
-// Everything below may run inside a signal handler and in a child just forked, beside other
-// threads: no lock, no allocation, nothing shared but these. The sockets stay unconnected, so that
-// each line finds the log daemon of its moment. A datagram queue holds only a few lines; the kernel
-// waits for room in a full one, at the first socket for a second, at the second for a moment.
+// Everything below may run inside a signal handler and in a forked child of a program with threads:
+// no lock, no allocation, and only these are shared. The sockets stay unconnected, so that each
+// line reaches the log daemon that runs now. A datagram queue holds only a few lines. If it is
+// full, the first socket waits a second for space, the second one a moment.
 std::atomic<int> patient_socket{-1};
 std::atomic<int> hurried_socket{-1};
 constexpr struct timeval kPatience = {1, 0};
 constexpr struct timeval kMoment = {0, 20'000};
 
-// Set when a line has waited its second in vain: the log daemon has its socket open and does not
-// read. Until a line gets through again, the others wait for a moment only.
+// Set when a line could not be sent within its second: the log daemon does not read its socket.
+// Until a line gets through again, the others wait for a moment only.
 std::atomic<bool> stalled{false};
 
 struct __attribute__((packed)) Header {
@@ -47,7 +47,7 @@ bool is_past(const struct timespec& deadline) {
 }
 
 bool send_line(const struct msghdr& message) {
-  // Signals may interrupt the wait again and again; it does not begin anew for ever.
+  // Signals may interrupt the wait again and again, but not past this deadline.
   struct timespec deadline;
   clock_gettime(CLOCK_MONOTONIC, &deadline);
   deadline.tv_sec += 2;
@@ -62,7 +62,7 @@ bool send_line(const struct msghdr& message) {
   return false;
 }
 
-// Writes to standard error, but neither waits for who reads it nor dies because nobody does.
+// Writes to standard error, without waiting for a slow reader and without SIGPIPE if there is none.
 void write_softly(const struct iovec* parts, int count) {
   struct pollfd ready = {STDERR_FILENO, POLLOUT, 0};
   if (poll(&ready, 1, 0) != 1 || (ready.revents & POLLOUT) == 0) return;
