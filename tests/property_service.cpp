@@ -8,12 +8,19 @@
 namespace corvexd::test {
 namespace {
 
-std::string receive_text(int client) {
-  uint32_t length = 0;
-  recv(client, &length, sizeof length, MSG_WAITALL);
-  std::string text(length, '\0');
-  if (length > 0) recv(client, text.data(), length, MSG_WAITALL);
-  return text;
+constexpr uint32_t kMaxText = 1024;
+
+// False when the request breaks off: its daemon was ended, or a child that was forked in the middle
+// of a failed request keeps the connection open.
+bool receive(int client, void* data, size_t size) {
+  return recv(client, data, size, MSG_WAITALL) == static_cast<ssize_t>(size);
+}
+
+bool receive_text(int client, std::string* text) {
+  uint32_t length;
+  if (!receive(client, &length, sizeof length) || length > kMaxText) return false;
+  text->resize(length);
+  return length == 0 || receive(client, text->data(), length);
 }
 
 }  // namespace
@@ -32,26 +39,26 @@ PropertyService::~PropertyService() {
 
 void PropertyService::serve() {
   for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
-    // A child that was forked in the middle of a request keeps the connection when it has failed.
-    const struct timeval patience = {2, 0};
-    setsockopt(client, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
-    uint32_t command = 0;
-    if (recv(client, &command, sizeof command, MSG_WAITALL) != sizeof command) {
-      close(client);  // its daemon was ended before it had asked
-      continue;
-    }
-    EXPECT_EQ(0x00020001u, command);
-    std::string key = receive_text(client);
-    std::string value = receive_text(client);
-    const uint32_t result = key.rfind("ro.", 0) == 0 ? 24 : 0;
-    if (result == 0 && key.rfind("ctl.", 0) != 0) set_property(key, value);
-    {
-      std::lock_guard<std::mutex> lock(mutex_);
-      requests_.emplace_back(key, value);
-    }
-    send(client, &result, sizeof result, MSG_NOSIGNAL);
+    serve_request(client);
     close(client);
   }
+}
+
+void PropertyService::serve_request(int client) {
+  const struct timeval patience = {5, 0};
+  setsockopt(client, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
+  uint32_t command;
+  std::string key, value;
+  if (!receive(client, &command, sizeof command)) return;
+  EXPECT_EQ(0x00020001u, command);
+  if (!receive_text(client, &key) || !receive_text(client, &value)) return;
+  const uint32_t result = key.rfind("ro.", 0) == 0 ? 24 : 0;
+  if (result == 0 && key.rfind("ctl.", 0) != 0) set_property(key, value);
+  {
+    std::lock_guard<std::mutex> lock(mutex_);
+    requests_.emplace_back(key, value);
+  }
+  send(client, &result, sizeof result, MSG_NOSIGNAL);
 }
 
 std::vector<std::pair<std::string, std::string>> PropertyService::requests() {

@@ -19,6 +19,7 @@ class PropertyService {
 
  private:
   void serve();
+  void serve_request(int client);
 
   int socket_;
   std::mutex mutex_;
