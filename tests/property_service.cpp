@@ -34,13 +34,16 @@ PropertyService::PropertyService()
 PropertyService::~PropertyService() {
   shutdown(socket_, SHUT_RDWR);
   server_.join();
+  for (std::thread& handler : handlers_) handler.join();
   close(socket_);
 }
 
 void PropertyService::serve() {
   for (int client; (client = accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC)) != -1;) {
-    serve_request(client);
-    close(client);
+    handlers_.emplace_back([this, client] {
+      serve_request(client);
+      close(client);
+    });
   }
 }
 

@@ -24,6 +24,7 @@ class PropertyService {
   int socket_;
   std::mutex mutex_;
   std::vector<std::pair<std::string, std::string>> requests_;
+  std::vector<std::thread> handlers_;  // one for each request
   std::thread server_;
 };
 
