@@ -59,10 +59,11 @@ void make_nodes(const std::string& daemon) {
   run("rm -rf /nodes; mkdir -p /nodes/proc/tzdbg /real_proc; cd /nodes; ln -s /real_proc/self "
       "proc; mkfifo kmsg proc/tzdbg/qsee_log proc/tzdbg/tz_log; for name in bootloader_log cmdline "
       "proc_transactions proc_transaction_log proc_state; do printf $name >proc/$name; done");
-  write_script(kDaemonWithNodes,
-               "exec unshare -m sh -c 'mount --rbind /proc /real_proc && mount --bind /nodes/kmsg "
-               "/dev/kmsg && mount --bind /nodes/proc /proc && exec " +
-                   daemon + "'");
+  write_script(
+      kDaemonWithNodes,
+      "exec setsid unshare -m sh -c 'mount --rbind /proc /real_proc && mount --bind /nodes/kmsg "
+      "/dev/kmsg && mount --bind /nodes/proc /proc && exec " +
+          daemon + "'");
 }
 
 size_t pauses(int seconds) {

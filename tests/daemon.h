@@ -33,7 +33,8 @@ class Daemon : public BootingDaemon {
 void make_device_ready();
 
 // Makes /nodes, each file in it holding its own name, and a program that is the given daemon with
-// those for the kernel's and the firmware's: its /proc is theirs, in which only `self` is real.
+// those for the kernel's and the firmware's: its /proc is theirs, in which only `self` is real. It
+// runs in a session of its own.
 extern const char* const kDaemonWithNodes;
 void make_nodes(const std::string& daemon = "/build/tests/corvexd_fast");
 

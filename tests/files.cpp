@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <sys/un.h>
 #include <sys/wait.h>
+#include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -99,10 +100,9 @@ int bound_socket(int type, const char* path) {
   return fd;
 }
 
-bool eventually(const std::function<bool()>& done) {
-  for (int i = 0; i < 1000; ++i) {
+bool eventually(const std::function<bool()>& done, int seconds) {
+  for (const time_t end = time(nullptr) + seconds; time(nullptr) <= end; usleep(2000)) {
     if (done()) return true;
-    usleep(10'000);
   }
   return false;
 }

@@ -36,8 +36,8 @@ bool has_ended(pid_t pid);
 // A socket of this type with this path; it does not listen yet.
 int bound_socket(int type, const char* path);
 
-// Asks `done` until it is true, for ten seconds at most; whether it came to that.
-bool eventually(const std::function<bool()>& done);
+// Asks `done` until it is true, for so many seconds at most; whether it came to that.
+bool eventually(const std::function<bool()>& done, int seconds = 10);
 #define EXPECT_EVENTUALLY(...) EXPECT_TRUE(eventually([&] { return __VA_ARGS__; }))
 #define ASSERT_EVENTUALLY(...) ASSERT_TRUE(eventually([&] { return __VA_ARGS__; }))
 

@@ -1,7 +1,5 @@
 #include "tools/faults/device.h"
 
-#include <stdio.h>
-#include <string.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -9,6 +7,7 @@
 #include <regex>
 
 #include "tests/daemon.h"
+#include "tests/device_root.h"
 #include "tests/files.h"
 
 namespace corvexd::faults {
@@ -17,22 +16,17 @@ namespace {
 using test::list, test::read_file, test::run;
 
 constexpr char kPartition[] = "/dev/block/platform/soc/624000.ufshc/by-name/reserve1";
-constexpr char kMark[] = "_current";
 constexpr const char* kRoots[] = {"/data/corvex", "/storage/emulated/0/corvex"};
 
 constexpr char kDevice[] = R"sh(
-rm -rf /data /cache /storage /system /vendor /probe /trace /dev/socket /dev/block \
-  /dev/__properties__ /etc/localtime
+rm -rf /trace /dev/block /etc/localtime
 mkdir -p /data/corvex/KVBR_1--2020-01-01-00-00-00_current /data/tombstones /data/anr \
   /data/system/dropbox /data/misc/display /data/media/0/Pictures/Screenshots /data/coredump \
-  /data/vendor/media /storage/emulated/0/corvex/earlier /system/bin /system/xbin /vendor/bin \
-  /vendor/etc /cache/boot_log /cache/log_before_initial /cache/recovery /cache/lkmsg /trace \
-  /probe /dev/socket /dev/__properties__ ${1%/*}
+  /data/vendor/media /storage/emulated/0/corvex/earlier /vendor/bin /vendor/etc /cache/boot_log \
+  /cache/log_before_initial /cache/recovery /cache/lkmsg /trace ${1%/*}
 cd /dev/__properties__
-for name in main system radio event kernel kernel.kmsg tcpdump qsee tz bootloader pre_bootloader \
-  qxdm; do
-  printf yes > persist.sys.$name
-done
+for name in main system radio event kernel kernel.kmsg tcpdump qsee tz bootloader pre_bootloader qxdm
+do printf yes > persist.sys.$name; done
 printf true > persist.sys.assert.panic
 printf 1 > vold.internalSD.mount
 printf 1 > persist.sys.kernel.logsize
@@ -65,46 +59,15 @@ chmod 755 /system/bin/* /system/xbin/* /vendor/bin/*
 
 // What is ours or the daemon's. What sets properties leaves a draft behind when the daemon ends in
 // the middle of a request.
-constexpr const char* kNotWatched[] = {"/usr",
-                                       "/build",
-                                       "/proc",
-                                       "/real_proc",
-
-                                       "/trace",
-                                       "/probe",
-                                       "/nodes",
-                                       "/dev/socket",
-                                       "/dev/__properties__",
-                                       "/dev/draft.",
-                                       "/data/corvex",
-                                       "/etc/localtime",
-                                       "/data/anr/anr_late_",
-                                       "/data/tombstones/tombstone_late_",
-                                       "/storage/emulated/0/corvex",
-                                       "/cache/boot_log",
-                                       "/cache/log_before_initial",
-                                       kPartition};
-
-bool is_watched(const std::string& path) {
-  return std::none_of(std::begin(kNotWatched), std::end(kNotWatched),
-                      [&](const char* start) { return path.rfind(start, 0) == 0; });
-}
+const std::regex kNotWatched(
+    "/(usr|build|proc|real_proc|trace|probe|nodes|dev/(socket|__properties__|draft|block/.*/"
+    "reserve1)|data/"
+    "corvex|"
+    "etc/localtime|data/anr/anr_late_|data/tombstones/tombstone_late_|storage/emulated/0/corvex|"
+    "cache/(boot_log|log_before_initial)).*");
 
 bool ends_with(const std::string& text, const std::string& end) {
   return text.size() >= end.size() && text.compare(text.size() - end.size(), end.size(), end) == 0;
-}
-
-void note(const std::string& path, bool all, Files& files) {
-  struct stat status;
-  if ((!all && !is_watched(path)) || lstat(path.c_str(), &status) != 0) return;
-  const bool is_folder = S_ISDIR(status.st_mode);
-  std::string& facts = files[is_folder ? path + "/" : path];
-  facts = "mode " + std::to_string(status.st_mode) + " owner " + std::to_string(status.st_uid) +
-          ":" + std::to_string(status.st_gid);
-  if (S_ISREG(status.st_mode)) facts += " content " + read_file(path);
-  if (!is_folder) return;
-  for (const std::string& name : list(path))
-    note((path == "/" ? "" : path) + "/" + name, all, files);
 }
 
 }  // namespace
@@ -113,6 +76,7 @@ const std::string kArtefactStart(2500, 'a');
 const std::string kArtefactEnd = "end of the artefact";
 
 void make_device() {
+  test::make_empty_device();
   test::write_file("/device.sh", kDevice);
   run(std::string("sh /device.sh ") + kPartition);
   unlink("/device.sh");
@@ -127,16 +91,24 @@ bool partition_is_sound() {
          content.find_first_not_of('r', zeros) == std::string::npos;
 }
 
-void look_at(const std::string& path, Files& files) { note(path, false, files); }
+void look_at(const std::string& path, Files& files, bool all) {
+  struct stat status;
+  if ((!all && std::regex_match(path, kNotWatched)) || lstat(path.c_str(), &status) != 0) return;
+  const bool is_folder = S_ISDIR(status.st_mode);
+  std::string& facts = files[is_folder ? path + "/" : path];
+  facts = "mode " + std::to_string(status.st_mode) + " owner " + std::to_string(status.st_uid) +
+          ":" + std::to_string(status.st_gid);
+  if (S_ISREG(status.st_mode)) facts += " content " + read_file(path);
+  if (!is_folder) return;
+  for (const std::string& name : list(path))
+    look_at((path == "/" ? "" : path) + "/" + name, files, all);
+}
 
 void compare(const Files& before, const Files& after, std::vector<std::string>& problems) {
   for (const auto& [path, facts] : before) {
     auto found = after.find(path);
-    if (found == after.end()) {
-      problems.push_back("removed: " + path);
-    } else if (found->second != facts) {
-      problems.push_back("changed: " + path);
-    }
+    if (found == after.end() || found->second != facts)
+      problems.push_back((found == after.end() ? "removed: " : "changed: ") + path);
   }
   for (const auto& [path, facts] : after) {
     if (before.count(path) != 0) continue;
@@ -146,19 +118,17 @@ void compare(const Files& before, const Files& after, std::vector<std::string>& 
 }
 
 Files read_logs() {
+  static const std::regex mark("_current");
   Files found, logs;
-  for (const char* root : kRoots) note(root, true, found);
-  for (auto& [path, facts] : found) {
-    const size_t mark = path.find(kMark);
-    logs[mark == std::string::npos ? path : std::string(path).erase(mark, strlen(kMark))] = facts;
-  }
+  for (const char* root : kRoots) look_at(root, found, true);
+  for (auto& [path, facts] : found) logs[std::regex_replace(path, mark, "")] = facts;
   return logs;
 }
 
 std::vector<std::string> marked_directories() {
   std::vector<std::string> marked;
   for (const std::string& name : list(kRoots[0])) {
-    if (name.find(kMark) != std::string::npos) marked.push_back(kRoots[0] + ("/" + name));
+    if (name.find("_current") != std::string::npos) marked.push_back(kRoots[0] + ("/" + name));
   }
   return marked;
 }

@@ -20,8 +20,8 @@ bool partition_is_sound();
 // Each path with all there is to it; directories end in "/".
 using Files = std::map<std::string, std::string>;
 
-// Notes `path`, with what lies below it, but for the places that the daemon writes to.
-void look_at(const std::string& path, Files& files);
+// Notes `path`, with what lies below it; without `all` not the places that the daemon writes to.
+void look_at(const std::string& path, Files& files, bool all = false);
 
 // Adds what differs to `problems`, and removes what was made.
 void compare(const Files& before, const Files& after, std::vector<std::string>& problems);
@@ -30,7 +30,7 @@ void compare(const Files& before, const Files& after, std::vector<std::string>& 
 Files read_logs();
 std::vector<std::string> marked_directories();
 
-// How often something was achieved, by a name that is the same in every life.
+// How often something was achieved, by a name that is the same in every run.
 using Achievements = std::map<std::string, int>;
 
 // Adds each of the logs, with numbers and times left out of its path, and how much of it there is.

@@ -1,9 +1,9 @@
-// Stands before the daemon's main: stops until somebody traces the process and lets it go on.
+// Runs before the daemon's main: stops until somebody traces the process and lets it go on.
 //
-// The tracer counts calls separately for each thread and child, and disturbs "the Nth call" of
-// every one of them. So that a fault can be meant for the main thread alone or for all others, the
-// main thread first makes kReservedCalls idle calls of that kind: its own calls come after that
-// number, and nobody else makes as many. The signal that kills is ignored meanwhile.
+// The tracer counts calls of each thread and child apart and disturbs the Nth of every one of them.
+// To disturb the main thread alone, or all others, the main thread first makes kReservedCalls idle
+// calls: its own come after that number, which no other reaches. The killing signal is ignored
+// meanwhile.
 #include <errno.h>
 #include <signal.h>
 #include <stdlib.h>

@@ -2,19 +2,20 @@
 
 #include <errno.h>
 #include <fcntl.h>
-#include <stdlib.h>
+#include <stdio.h>
 #include <sys/socket.h>
 #include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
+#include <functional>
 #include <map>
 #include <memory>
+#include <regex>
 #include <set>
 #include <thread>
 
-#include "tests/daemon.h"
 #include "tests/device_root.h"
 #include "tests/files.h"
 #include "tests/log_catcher.h"
@@ -27,22 +28,16 @@ using namespace test;  // NOLINT(google-build-using-namespace): the device and i
 
 constexpr char kTombstones[] = "LOGS/TIME/tombstones/TIME/";  // as achievements
 constexpr char kTraceFolder[] = "LOGS/TIME/anr/TIME/";
-constexpr char kOldFile[] = "/data/corvex/KVBR_1--2020-01-01-00-00-00/old";
 constexpr int kWaitingLooks = 3;
 constexpr int kLookPeriod = 10'000;  // microseconds
-constexpr size_t kWatches = 9;
+constexpr int kWatches = 9;
 constexpr long kTenYears = 315'360'000;
 constexpr int kDisturbances = 6;  // of one run
 
-bool may_be_set(const std::string& key, const std::string& value) {
-  static const std::set<std::pair<std::string, std::string>> rows = {
-      {"persist.oem.nfc.debug", "1"}, {"oem.after.clear", "false"},
-      {"debug.sf.dump", "0"},         {"ctl.start", "diag_mdlog_start"},
-      {"ctl.restart", "logd"},        {"ctl.restart", "logd-reinit"},
-      {"ctl.restart", "corvexd"}};
-  bool is_level = value == "VERBOSE" || value == "INFO";
-  return rows.count({key, value}) != 0 || (is_level && key.rfind("log.tag.", 0) == 0);
-}
+// What may be set, each property with its value.
+const std::regex kSettings(
+    "log\\.tag\\..*=(VERBOSE|INFO)|persist\\.oem\\.nfc\\.debug=1|oem\\.after\\.clear=false|"
+    "debug\\.sf\\.dump=0|ctl\\.start=diag_mdlog_start|ctl\\.restart=(logd|logd-reinit|corvexd)");
 
 // Ten years ahead of UTC, which shows in the names: a zone's file with one offset and no change.
 std::string far_zone() {
@@ -52,16 +47,6 @@ std::string far_zone() {
   return file + std::string("\x12\xcc\x03\x00\0\0FAR\0", 10);
 }
 
-bool is_in_that_zone(const std::string& directory) {
-  const time_t there = time(nullptr) + kTenYears;
-  const std::string year = std::to_string(gmtime(&there)->tm_year + 1900);
-  return directory.find("--" + year) != std::string::npos;
-}
-
-void write_to(int fd, const std::string& text) {
-  if (write(fd, text.data(), text.size()) != static_cast<ssize_t>(text.size())) _exit(1);
-}
-
 bool has_come(const std::string& achievement) {
   usleep(10'000);
   Achievements achieved;
@@ -69,12 +54,12 @@ bool has_come(const std::string& achievement) {
   return achieved.count(achievement) != 0;
 }
 
-// Never waits for ever. A start may wait for ever for what can never be opened; a client who may
-// give up then sends nothing more.
+// Never waits for ever. A start may wait for ever for what can never be opened: an impatient client
+// then sends nothing more.
 class Client {
  public:
-  Client(TracedDaemon& daemon, std::vector<std::string>& problems, bool may_give_up)
-      : daemon_(daemon), problems_(problems), may_give_up_(may_give_up) {}
+  Client(TracedDaemon& daemon, std::vector<std::string>& problems, int patience = kPatience)
+      : daemon_(daemon), problems_(problems), patience_(patience) {}
 
   // Sends the command over a connection of its own and returns what came back until the daemon
   // ended it.
@@ -84,29 +69,29 @@ class Client {
     ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
     shutdown(fd_, SHUT_WR);
     std::string reply;
-    bool ended = wait_until([&] {
+    auto has_ended = [&] {
       char buffer[64];
       ssize_t count = recv(fd_, buffer, sizeof buffer, MSG_DONTWAIT);
       if (count > 0) reply.append(buffer, count);
       // Children of a daemon that was killed keep its connections open.
       return count == -1 && errno == EAGAIN ? daemon_.has_ended() : count <= 0;
-    });
-    if (!ended) problems_.push_back("hangs at " + command);
+    };
+    if (!eventually(has_ended, kPatience)) problems_.push_back("hangs at " + command);
     close(fd_);
     return reply;
   }
 
  private:
   bool connect() {
-    gave_up_ = !wait_until([&] { return (fd_ = try_to_connect()) != -1 || daemon_.has_ended(); },
-                           may_give_up_ ? kPatience / 4 : kPatience);
-    if (gave_up_ && !may_give_up_) problems_.emplace_back("does not serve");
+    gave_up_ = !eventually([&] { return (fd_ = try_to_connect()) != -1 || daemon_.has_ended(); },
+                           patience_);
+    if (gave_up_ && patience_ == kPatience) problems_.emplace_back("does not serve");
     return fd_ != -1;
   }
 
   TracedDaemon& daemon_;
   std::vector<std::string>& problems_;
-  const bool may_give_up_;
+  const int patience_;
   bool gave_up_ = false;
   int fd_ = -1;
 };
@@ -118,7 +103,8 @@ class Scenario {
         run_(run),
         outside_(outside),
         daemon_(std::make_unique<TracedDaemon>(fault, traced)),
-        client_(*daemon_, run.problems, fault != nullptr && fault->lasting) {}
+        client_(*daemon_, run.problems,
+                fault != nullptr && fault->lasting ? kPatience / 4 : kPatience) {}
 
   void play() {
     for (const char* node :
@@ -142,7 +128,7 @@ class Scenario {
     std::atomic<bool> done{mode_ != Mode::kDelay};
     std::vector<std::string> arrived, problems;
     std::thread others([&] {
-      Client client(*daemon_, problems, false);
+      Client client(*daemon_, problems);
       for (char number = 'a'; number < 'a' + kDisturbances && !done;) {
         if (daemon_->is_held_up()) disturb(client, number++, arrived);
       }
@@ -152,7 +138,7 @@ class Scenario {
     others.join();
     run_.problems.insert(run_.problems.end(), problems.begin(), problems.end());
     for (const std::string& wanted : arrived) {
-      if (!wait_until([&] { return is_deleted_ || has_come(wanted); }))
+      if (!eventually([&] { return is_deleted_ || has_come(wanted); }, kPatience))
         run_.problems.push_back("loses what arrived meanwhile: " + wanted);
     }
     see_what_was_achieved();
@@ -162,10 +148,10 @@ class Scenario {
     const std::string tombstone = std::string("tombstone_late_") + number;
     const std::string trace = std::string("anr_late_") + number;
     int fd = open(("/data/anr/" + trace).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
-    write_to(fd, kArtefactStart);
+    dprintf(fd, "%s", kArtefactStart.c_str());
     write_file("/data/tombstones/" + tombstone, kArtefactStart + kArtefactEnd);
     client.send("LOGBEGIN");
-    write_to(fd, kArtefactEnd);
+    dprintf(fd, "%s", kArtefactEnd.c_str());
     close(fd);
     arrived.push_back(kTombstones + tombstone + " whole");
     arrived.push_back(kTraceFolder + trace + " whole");
@@ -175,14 +161,14 @@ class Scenario {
     feed_nodes();
     make_artefacts();
     int trace = open("/data/anr/anr_open", O_WRONLY | O_CREAT | O_CLOEXEC, 0644);
-    write_to(trace, kArtefactStart);
+    dprintf(trace, "%s", kArtefactStart.c_str());
     send_all({"CACHECLEAR", "BUGREPORT", "WIFI_SNIFFLOG_START", "OEM_GPS_DEBUG_ENABLE",
               "OEM_BT_DEBUG_ENABLE", "OEM_NFC_DEBUG_DISABLE"});
     settle();  // its recorders, too, have begun then
     send_all({"LOGSTOP"});
     write_file("/etc/localtime", far_zone());
     send_all({"LOGBEGIN"});
-    write_to(trace, kArtefactEnd);
+    dprintf(trace, "%s", kArtefactEnd.c_str());
     close(trace);
     look_at("/data/anr/anr_open", outside_);
     send_all({"CPUTHERMAL", "WIFI_SNIFFLOG_STOP", "WIFI_SNIFFLOG_START"});
@@ -196,7 +182,8 @@ class Scenario {
     known_.clear();
     is_deleted_ = true;
     ++run_.achieved["deletion answered " + client_.send("DELETELOG")];
-    if (read_logs().count(kOldFile) == 0) ++run_.achieved["what was deleted is gone"];
+    if (read_logs().count("/data/corvex/KVBR_1--2020-01-01-00-00-00/old") == 0)
+      ++run_.achieved["what was deleted is gone"];
     send_all({"CPUTHERMAL"});
     finish_artefacts("tombstone_after");
     send_all({"STOPCPUTHERMAL"});
@@ -204,7 +191,7 @@ class Scenario {
 
   void feed_nodes() {
     const std::string block(2500, 'k');
-    for (int node : nodes_) write_to(node, block);
+    for (int node : nodes_) dprintf(node, "%s", block.c_str());
   }
 
   void make_artefacts() {
@@ -260,49 +247,51 @@ class Scenario {
     check_known(logs);
     count_logs(logs, run_.achieved);
     if (marked_directories().size() == 1) ++run_.achieved["one mark"];
+    const time_t there = time(nullptr) + kTenYears;
+    const std::string year = "--" + std::to_string(gmtime(&there)->tm_year + 1900);
     for (const std::string& path : known_) {
-      if (is_in_that_zone(path)) ++run_.achieved["a name in the new zone"];
+      if (holds(path, year.c_str())) ++run_.achieved["a name in the new zone"];
     }
   }
 
   // Waits for what may never be when calls fail.
-  template <typename Done>
-  void wait_for(const Done& done) {
-    wait_until([&] { return done() || daemon_->has_ended(); },
+  void wait_for(const std::function<bool()>& done) {
+    eventually([&] { return done() || daemon_->has_ended(); },
                mode_ == Mode::kFail ? 1 : kPatience);
   }
 
   bool watches() {
+    static const std::regex watch("inotify wd:");
     std::string facts;
     const std::string folder = "/proc/" + std::to_string(daemon_->pid()) + "/fdinfo/";
     for (const std::string& fd : list(folder)) facts += read_file(folder + fd);
-    size_t count = 0;
-    for (size_t at = 0; (at = facts.find("inotify wd:", at)) != std::string::npos; ++at) ++count;
-    return count == kWatches;
+    return std::distance(std::sregex_iterator(facts.begin(), facts.end(), watch), {}) == kWatches;
   }
 
   // Waits until each of its threads has been seen waiting, and more than once: a busy machine makes
   // all of them look busy now and then, but only one that spins always.
   bool settle() {
     std::map<std::string, int> seen_waiting;
-    return wait_until([&] {
+    auto all_wait = [&] {
       usleep(kLookPeriod);
-      bool all_wait = true;
-      for (const auto& [task, waits] : daemon_->tasks()) {
-        all_wait = (seen_waiting[task] += waits) >= kWaitingLooks && all_wait;
+      bool all = true;
+      for (const auto& [task, state] : daemon_->tasks()) {
+        const bool waits = state != 'R' && state != 'D' && state != 't';
+        all = (seen_waiting[task] += waits) >= kWaitingLooks && all;
       }
-      return all_wait;
-    });
+      return all;
+    };
+    return eventually(all_wait, kPatience);
   }
 
   // Untraced and undisturbed it carries out commands, if need be after init has started it again.
   void look_after_it() {
     bool starts_again = daemon_->has_ended() || mode_ == Mode::kKill;
-    if (daemon_->has_ended()) run_.status = daemon_->status();
+    run_.status = daemon_->status();
     if (starts_again) daemon_->end();  // its children too
     const Files before = read_logs();
     if (starts_again) daemon_ = std::make_unique<TracedDaemon>(nullptr, "");
-    Client client(*daemon_, run_.problems, false);
+    Client client(*daemon_, run_.problems);
     if (starts_again) client.send("CHANGEPATH");
     client.send("LOGBEGIN");
     const Files after = read_logs();
@@ -349,7 +338,8 @@ Run run_scenario(const Fault* fault, const std::string& traced) {
   look_at("/", after);
   compare(before, after, run.problems);
   for (const auto& [key, value] : service.requests()) {
-    if (!may_be_set(key, value)) run.problems.push_back("sets " + key + " to " + value);
+    if (!std::regex_match(key + "=" + value, kSettings))
+      run.problems.push_back("sets " + key + " to " + value);
   }
   if (!partition_is_sound()) run.problems.emplace_back("the partition is neither log nor zeros");
   run.log = log.texts();

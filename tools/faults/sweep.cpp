@@ -1,6 +1,8 @@
 // Runs the daemon again and again, and each time another of its system calls fails, is its last, or
 // takes long.
+#include <fcntl.h>
 #include <stdio.h>
+#include <stdlib.h>
 #include <string.h>
 #include <sys/mman.h>
 #include <sys/syscall.h>
@@ -49,7 +51,6 @@ const std::vector<Row> kRows = {
     {"clone", SYS_clone, {"error=EAGAIN", "error=ENOMEM"}, "error=EAGAIN"},
     {"clone3", SYS_clone3, {"error=EAGAIN", "error=ENOMEM"}, "error=EAGAIN"},
     {"execve", SYS_execve, {"error=EACCES", "error=ENOMEM"}, nullptr},
-    {"pipe2", SYS_pipe2, {"error=EMFILE", "error=ENFILE"}, "error=ENFILE"},
     {"mmap", SYS_mmap, {"error=ENOMEM"}, nullptr},
     {"inotify_init1", SYS_inotify_init1, {"error=EMFILE", "error=ENOMEM"}, nullptr},
     {"inotify_add_watch", SYS_inotify_add_watch, {"error=ENOSPC", "error=EACCES"}, "error=ENOSPC"},
@@ -83,29 +84,21 @@ struct Counters {
   std::atomic<size_t> planned, runs, disturbed, problems;
 };
 
-struct PlannedFault {
-  Fault fault;
-  std::string callers;  // of the call
-};
-
 std::string describe(const Fault& fault) {
   return std::string(fault.call) + ":" + fault.outcome + (fault.lasting ? "+" : "") + " call " +
          std::to_string(fault.when) + " of " + (fault.in_main ? "the main thread" : "the others");
 }
 
 std::vector<Fault> faults_at(const Row& row, const Call& call) {
-  const Fault base = {Mode::kFail, row.call, row.number, nullptr, false, call.in_main, call.when};
   std::vector<Fault> faults;
-  auto add = [&](Mode mode, const char* outcome, bool lasting) {
-    faults.push_back(base);
-    faults.back().mode = mode;
-    faults.back().outcome = outcome;
-    faults.back().lasting = lasting;
+  auto add = [&](Mode mode, const char* outcome, bool lasting = false) {
+    faults.push_back(
+        {mode, row.call, row.number, outcome, lasting, call.in_main, call.when, call.callers});
   };
-  for (const char* error : row.errors) add(Mode::kFail, error, false);
+  for (const char* error : row.errors) add(Mode::kFail, error);
   if (row.lasting != nullptr) add(Mode::kFail, row.lasting, true);
-  add(Mode::kKill, "signal=USR2", false);  // kKillingSignal
-  add(Mode::kDelay, "delay_enter=300000", false);
+  add(Mode::kKill, "signal=USR2");  // kKillingSignal
+  add(Mode::kDelay, "delay_enter=300000");
   return faults;
 }
 
@@ -118,8 +111,8 @@ bool is_wanted(const Fault& fault, const Options& options, size_t worker) {
 
 // Every chain of callers that makes a call in a run without faults sees its first such call
 // disturbed, for the main thread and for all others apart.
-std::vector<PlannedFault> make_plan(const Run& run, const Options& options, size_t worker) {
-  std::vector<PlannedFault> plan;
+std::vector<Fault> make_plan(const Run& run, const Options& options, size_t worker) {
+  std::vector<Fault> plan;
   for (const Row& row : kRows) {
     if (!options.call.empty() && options.call != row.call) continue;
     std::set<std::string> chains;
@@ -129,7 +122,7 @@ std::vector<PlannedFault> make_plan(const Run& run, const Options& options, size
       if (!chains.insert(call.site).second || !known.insert({call.in_main, call.when}).second)
         continue;
       for (const Fault& fault : faults_at(row, call)) {
-        if (is_wanted(fault, options, worker)) plan.push_back({fault, call.callers});
+        if (is_wanted(fault, options, worker)) plan.push_back(fault);
       }
     }
   }
@@ -142,23 +135,24 @@ std::string traced_calls() {
   return all;
 }
 
+// Where standard output was: the daemon and its tracer get /dev/null.
+int report = STDOUT_FILENO;
+
 // One write, so that the workers' lines do not mix; on a terminal, over the progress.
 void say(const std::string& text) {
-  static const std::regex line_end("\n");
-  const std::string line =
-      (isatty(STDOUT_FILENO) ? "\r\033[K" : "") + std::regex_replace(text, line_end, "\\n") + "\n";
-  ssize_t ignored = write(STDOUT_FILENO, line.data(), line.size());
+  const std::string line = (isatty(report) ? "\r\033[K" : "") + text + "\n";
+  ssize_t ignored = write(report, line.data(), line.size());
   (void)ignored;
 }
 
 // A run that goes wrong is repeated: what is wrong again is a finding, what is not is told apart.
-void try_fault(const PlannedFault& planned, const Normal& normal, Counters& counters) {
+void try_fault(const Fault& fault, const Normal& normal, Counters& counters) {
   static const std::regex time("[0-9]{4}(-[0-9]{2}){5}");
   std::map<std::string, int> seen;
   bool disturbed = false, wrong = false;
   for (int i = 0; i < kTries && (i == 0 || !seen.empty()); ++i) {
-    Run run = run_scenario(&planned.fault, "");
-    judge(&planned.fault, normal, run);
+    Run run = run_scenario(&fault, "");
+    judge(&fault, normal, run);
     disturbed = disturbed || !run.calls.empty() || run.status != -1;
     std::set<std::string> problems;
     for (const std::string& text : run.problems)
@@ -166,8 +160,8 @@ void try_fault(const PlannedFault& planned, const Normal& normal, Counters& coun
     for (const std::string& problem : problems) ++seen[problem];
   }
   for (const auto& [problem, times] : seen) {
-    say((times > 1 ? "WRONG: " : "once in three: ") + describe(planned.fault) + " in " +
-        planned.callers + ": " + problem);
+    say((times > 1 ? "WRONG: " : "once in three: ") + describe(fault) + " in " + fault.callers +
+        ": " + problem);
     wrong = wrong || times > 1;
   }
   counters.disturbed += disturbed;
@@ -178,19 +172,23 @@ void try_fault(const PlannedFault& planned, const Normal& normal, Counters& coun
 // In a device root of its own.
 void work(const Options& options, size_t worker, Counters& counters) {
   test::enter_device_root();
+  report = fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3);
+  const int null = open("/dev/null", O_RDWR | O_CLOEXEC);
+  for (int fd : {0, 1, 2}) dup2(null, fd);
+  unsetenv("TZ");
   Normal normal;
-  std::vector<PlannedFault> plan;
+  std::vector<Fault> plan;
   for (int i = 0; i < kNormalRuns; ++i) {
     // Unhurried by the tracer, too.
     Run run = run_scenario(nullptr, i == 0 ? traced_calls() : "");
     if (i == 0) plan = make_plan(run, options, worker);
-    add_to_normal(run, i == 0, normal);
+    add_to_normal(run, normal);
     judge(nullptr, normal, run);
     counters.problems += run.problems.size();
     for (const std::string& problem : run.problems) say("WRONG: no fault: " + problem);
   }
   counters.planned += plan.size();
-  for (const PlannedFault& planned : plan) try_fault(planned, normal, counters);
+  for (const Fault& fault : plan) try_fault(fault, normal, counters);
 }
 
 int sweep(const Options& options) {
@@ -198,9 +196,10 @@ int sweep(const Options& options) {
   auto& counters = *static_cast<Counters*>(
       mmap(nullptr, sizeof(Counters), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
   auto show = [&] {
-    printf("%zu of %zu runs in %lld s, %zu of them disturbed, %zu wrong", counters.runs.load(),
-           counters.planned.load(), static_cast<long long>(time(nullptr) - start),
-           counters.disturbed.load(), counters.problems.load());
+    printf("%s%zu of %zu runs in %lld s, %zu of them disturbed, %zu wrong",
+           isatty(STDOUT_FILENO) ? "\r" : "", counters.runs.load(), counters.planned.load(),
+           static_cast<long long>(time(nullptr) - start), counters.disturbed.load(),
+           counters.problems.load());
     fflush(stdout);
   };
   for (size_t worker = 0; worker < kWorkers; ++worker) {
@@ -211,9 +210,7 @@ int sweep(const Options& options) {
   bool all_ended_well = true;
   for (int ended, status; (ended = waitpid(-1, &status, WNOHANG)) != -1; usleep(200'000)) {
     if (ended > 0) all_ended_well = all_ended_well && status == 0;
-    if (!isatty(STDOUT_FILENO)) continue;
-    printf("\r");
-    show();
+    if (isatty(STDOUT_FILENO)) show();
   }
   show();
   printf("\n");

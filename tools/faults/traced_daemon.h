@@ -3,13 +3,12 @@
 
 #include <signal.h>
 #include <sys/types.h>
-#include <time.h>
-#include <unistd.h>
 
 #include <map>
-#include <mutex>
 #include <string>
 #include <vector>
+
+#include "tests/daemon.h"
 
 namespace corvexd::faults {
 
@@ -31,6 +30,7 @@ struct Fault {
   bool lasting;         // and of every call after it
   bool in_main;
   int when;
+  std::string callers;  // of the call, for the report
 };
 
 // A call that was traced.
@@ -42,39 +42,26 @@ struct Call {
   std::string callers;  // the daemon's functions, outermost first
 };
 
-// Asks until it is so, or patience ends.
-template <typename Done>
-bool wait_until(const Done& done, int patience = kPatience) {
-  const time_t end = time(nullptr) + patience;
-  while (!done()) {
-    if (time(nullptr) > end) return false;
-    usleep(1000);
-  }
-  return true;
-}
+bool holds(const std::string& text, const char* part);
 
-// The daemon at its gate, started as init does it, and in a session by which all its descendants
-// are found. When it has ended they are ended, as init does that, too.
-class TracedDaemon {
+// The daemon at its gate, in a session by which all its descendants are found. When it has ended
+// they are ended, as init does that, too.
+class TracedDaemon : public test::BootingDaemon {
  public:
   // With a fault it is disturbed, and what failed is written down; else every call named in
   // `traced` is. With neither it lives alone.
   TracedDaemon(const Fault* fault, const std::string& traced);
   ~TracedDaemon() { end(); }
 
-  TracedDaemon(const TracedDaemon&) = delete;
-  TracedDaemon& operator=(const TracedDaemon&) = delete;
-
-  pid_t pid() const { return pid_; }
-  bool has_ended();    // and its descendants with it
-  int status() const;  // as a shell shows it
+  // The status with which it ended, as a shell shows it; -1 while it lives. Any thread.
+  int status() const;
+  bool has_ended() const { return status() != -1; }
 
   // Whether the tracer holds up one of its threads or children for longer than each stop takes.
   bool is_held_up() const;
 
-  // Its threads and those of its descendants, and whether each waits: for its time, for another, or
-  // for nothing any more.
-  std::map<std::string, bool> tasks() const;
+  // Its threads and those of its descendants, each with its state as /proc shows it.
+  std::map<std::string, char> tasks() const;
 
   // Takes the tracer away; the daemon goes on. Returns the calls that it wrote down.
   std::vector<Call> let_go();
@@ -83,16 +70,10 @@ class TracedDaemon {
   void end();
 
  private:
-  void kill_all() const;
-  void attach(const std::string& tracer);
   std::vector<pid_t> processes() const;
-  std::map<std::string, char> task_states() const;
 
   const bool only_disturbed_;
-  pid_t pid_ = 0, tracer_ = 0;
-  std::mutex mutex_;  // over what follows
-  bool ended_ = false;
-  int status_ = 0;
+  pid_t tracer_ = 0;
 };
 
 }  // namespace corvexd::faults
