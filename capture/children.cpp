@@ -22,11 +22,12 @@
 // - It is never held across fork(). The C library takes its allocation locks there; a thread
 //   interrupted inside an allocation would otherwise spin in the handler for a lock whose owner
 //   waits for that very allocation.
-// - Between a fork and the storing of its result, no slot names the child. SIGCHLDs that arrive
-// then
-//   are counted, and the starter handles them right afterwards: a child that ends at once is still
-//   found in its slot. Two threads start children. Each holds the mutex over the local time while
-//   it does, so one start ends before the next begins.
+// - The forking thread blocks SIGCHLD. In the child, the lock may be held by a thread that does not
+//   exist there; a handler that ran before the lock is reset would wait forever.
+// - Between a fork and the storing of its result, no slot names the child. SIGCHLDs that other
+//   threads get then are counted, and the starter handles them right afterwards: a child that ends
+//   at once is still found in its slot. Two threads start children. Each holds the mutex over the
+//   local time while it does, so one start ends before the next begins.
 
 namespace corvexd {
 namespace {
@@ -36,24 +37,31 @@ ChildSlot* known_slots = nullptr;
 bool starting = false;
 int pending_deliveries = 0;
 
-class SlotLock {
+class SigchldBlock {
  public:
-  SlotLock() {
+  SigchldBlock() {
     sigset_t child_ended;
     sigemptyset(&child_ended);
     sigaddset(&child_ended, SIGCHLD);
     pthread_sigmask(SIG_BLOCK, &child_ended, &earlier_mask_);
-    while (slots_locked.test_and_set(std::memory_order_acquire)) sched_yield();
   }
-  ~SlotLock() {
-    slots_locked.clear(std::memory_order_release);
-    pthread_sigmask(SIG_SETMASK, &earlier_mask_, nullptr);
-  }
-  SlotLock(const SlotLock&) = delete;
-  SlotLock& operator=(const SlotLock&) = delete;
+  ~SigchldBlock() { pthread_sigmask(SIG_SETMASK, &earlier_mask_, nullptr); }
+  SigchldBlock(const SigchldBlock&) = delete;
+  SigchldBlock& operator=(const SigchldBlock&) = delete;
 
  private:
   sigset_t earlier_mask_;
+};
+
+class SlotLock {
+ public:
+  SlotLock() {
+    while (slots_locked.test_and_set(std::memory_order_acquire)) sched_yield();
+  }
+  ~SlotLock() { slots_locked.clear(std::memory_order_release); }
+
+ private:
+  SigchldBlock blocked_;  // from before the lock is taken until after it is free
 };
 
 void begin_start(ChildSlot& slot) {
@@ -82,6 +90,18 @@ int end_start(ChildSlot& slot, pid_t result) {
   int pending = pending_deliveries;
   pending_deliveries = 0;
   return pending;
+}
+
+// In the parent, *pending gets what end_start returns.
+pid_t fork_and_store(ChildSlot& slot, int* pending) {
+  SigchldBlock blocked;
+  pid_t result = fork();
+  if (result == 0) {
+    reset_after_fork();
+  } else {
+    *pending = end_start(slot, result);
+  }
+  return result;
 }
 
 void mark_ended(ChildSlot& slot, int status) {
@@ -127,16 +147,14 @@ void start_child(ChildSlot& slot, void (*body)(const void*), const void* argumen
   local_time_mutex.lock();
   reap_merged_ends();
   begin_start(slot);
-  pid_t result = fork();
+  int pending = 0;
+  pid_t result = fork_and_store(slot, &pending);
   int error = errno;
+  local_time_mutex.unlock();
   if (result == 0) {
-    reset_after_fork();
-    local_time_mutex.unlock();
     body(argument);
     _exit(1);
   }
-  int pending = end_start(slot, result);
-  local_time_mutex.unlock();
   for (; pending > 0; --pending) on_sigchld();
   errno = error;
 }

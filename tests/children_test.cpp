@@ -132,7 +132,15 @@ class Storm {
   std::thread thread_;
 };
 
+bool children_begin_with_a_signal = false;
+
+void signal_new_child() {
+  if (children_begin_with_a_signal) raise(SIGCHLD);
+}
+
 TEST_F(Children, ForkBesideThreadsInsideTheLibraryNeverHangs) {
+  ASSERT_EQ(0, pthread_atfork(nullptr, nullptr, signal_new_child));
+  children_begin_with_a_signal = true;
   // A handler that interrupts an allocation waits for the log's reader, who allocates as well here.
   log.stop();
   ASSERT_NE(nullptr, freopen("/dev/null", "w", stderr));
