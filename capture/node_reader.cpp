@@ -139,7 +139,8 @@ void copy_source(const NodeReader& reader, const char* path) {
 void erase_source(const NodeReader& reader) {
   const char zeros[kBlockSize] = {};
   for (int i = 0; i < reader.max_reads; ++i) {
-    if (pwrite(*reader.from_fd, zeros, sizeof zeros, i * sizeof zeros) == -1) {
+    const auto offset = static_cast<off_t>(i * kBlockSize);
+    if (pwrite(*reader.from_fd, zeros, sizeof zeros, offset) == -1) {
       log_failed_write(reader, errno);
       return;
     }
